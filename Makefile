@@ -1,0 +1,41 @@
+# The two commands a user needs: `make run` and `make test`. Both install any
+# missing Debian packages first.
+SHELL := /bin/bash
+JOBS ?= $(shell nproc)
+LISTEN ?= 127.0.0.1:8080
+
+.PHONY: run test deps release asan tsan tsan-test fuzz clean
+
+deps:
+	@scripts/install-deps.sh
+
+release: deps
+	cmake --preset release >/dev/null
+	cmake --build --preset release -j $(JOBS)
+
+asan: deps
+	cmake --preset asan >/dev/null
+	cmake --build --preset asan -j $(JOBS)
+
+# Starts the plug-in in the stand-in host on $(LISTEN) with the built-in
+# simulated platform; Ctrl-C stops it.
+run: release
+	scripts/run.sh build/release $(LISTEN)
+
+# Builds everything under AddressSanitizer and UndefinedBehaviorSanitizer and
+# runs every test.
+test: asan
+	ctest --preset asan
+
+tsan-test: deps
+	cmake --preset tsan >/dev/null
+	cmake --build --preset tsan -j $(JOBS)
+	ctest --preset tsan
+
+fuzz:
+	@scripts/install-deps.sh fuzz
+	cmake --preset fuzz >/dev/null
+	cmake --build --preset fuzz -j $(JOBS)
+
+clean:
+	rm -rf build

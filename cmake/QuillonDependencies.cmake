@@ -1,0 +1,14 @@
+# Third-party packages, all from Debian (scripts/install-deps.sh installs them).
+find_package(PkgConfig REQUIRED)
+find_package(Threads REQUIRED)
+pkg_check_modules(CJSON REQUIRED IMPORTED_TARGET libcjson)
+pkg_check_modules(MICROHTTPD REQUIRED IMPORTED_TARGET libmicrohttpd)
+pkg_check_modules(LIBCURL REQUIRED IMPORTED_TARGET libcurl)
+
+if(QUILLON_BUILD_TESTS)
+  find_package(GTest REQUIRED)
+  include(GoogleTest)
+endif()
+if(QUILLON_BUILD_BENCH)
+  find_package(benchmark REQUIRED)
+endif()

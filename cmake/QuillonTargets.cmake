@@ -1,0 +1,43 @@
+# Warnings for our own code; third-party headers come in as system headers.
+add_library(quillon_warnings INTERFACE)
+target_compile_options(quillon_warnings INTERFACE -Wall -Wextra -Werror)
+
+# quillon_library(<name> SOURCES <files...> [DEPS <targets...>] [PRIVATE_DEPS <targets...>])
+# A static library of our code. Its folder's parent is on the include path, so
+# headers are included as "<folder>/<header>.h".
+function(quillon_library name)
+  cmake_parse_arguments(ARG "" "" "SOURCES;DEPS;PRIVATE_DEPS" ${ARGN})
+  add_library(${name} STATIC ${ARG_SOURCES})
+  target_include_directories(${name} PUBLIC ${PROJECT_SOURCE_DIR}/src)
+  target_link_libraries(${name} PUBLIC ${ARG_DEPS} PRIVATE quillon_warnings ${ARG_PRIVATE_DEPS})
+endfunction()
+
+# quillon_test(<name> SOURCES <files...> [LIBS <targets...>] [TIMEOUT <seconds>])
+# One GoogleTest program, run by CTest as one test.
+function(quillon_test name)
+  cmake_parse_arguments(ARG "" "TIMEOUT" "SOURCES;LIBS" ${ARGN})
+  if(NOT ARG_TIMEOUT)
+    set(ARG_TIMEOUT 300)
+  endif()
+  add_executable(${name} ${ARG_SOURCES})
+  target_include_directories(${name} PRIVATE ${PROJECT_SOURCE_DIR}/tests)
+  target_link_libraries(${name} PRIVATE ${ARG_LIBS} quillon_warnings
+                        GTest::gmock GTest::gtest_main Threads::Threads)
+  add_test(NAME ${name} COMMAND ${name})
+  set_tests_properties(${name} PROPERTIES TIMEOUT ${ARG_TIMEOUT})
+endfunction()
+
+# quillon_benchmark(<name> SOURCES <files...> [LIBS <targets...>])
+function(quillon_benchmark name)
+  cmake_parse_arguments(ARG "" "" "SOURCES;LIBS" ${ARGN})
+  add_executable(${name} ${ARG_SOURCES})
+  target_link_libraries(${name} PRIVATE ${ARG_LIBS} quillon_warnings benchmark::benchmark)
+endfunction()
+
+# quillon_fuzzer(<name> SOURCES <files...> [LIBS <targets...>])
+function(quillon_fuzzer name)
+  cmake_parse_arguments(ARG "" "" "SOURCES;LIBS" ${ARGN})
+  add_executable(${name} ${ARG_SOURCES})
+  target_link_libraries(${name} PRIVATE ${ARG_LIBS} quillon_warnings)
+  target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+endfunction()

@@ -1,0 +1,12 @@
+#!/usr/bin/env bash
+# Starts the stand-in host with the plug-in of the given build folder.
+set -euo pipefail
+build=${1:?build folder}
+listen=${2:-127.0.0.1:8080}
+root=$(cd "$(dirname "$0")/.." && pwd)
+host="$root/$build/bin/ws-runtime"
+if [ ! -x "$host" ]; then
+  echo "run: $host is not built yet" >&2
+  exit 1
+fi
+exec "$host" --listen "$listen"
