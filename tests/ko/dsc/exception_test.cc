@@ -1,0 +1,97 @@
+#include "ko/dsc/exception.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <functional>
+#include <string>
+
+#include "ko/dsc/osdep/os_exception.h"
+
+namespace ko::dsc {
+namespace {
+
+using namespace exception;
+
+struct MemberCase {
+  const char* name;
+  std::function<void()> raiseDefault;
+  int32_t code;
+  const char* defaultText;
+};
+
+template <typename T>
+std::function<void()> raiser() {
+  return [] { throw T(); };
+}
+
+TEST(ExceptionFamily, MembersReportTheirCodeAndDefaultTextThroughTheBase) {
+  const MemberCase cases[] = {
+      {"Exception", raiser<Exception>(), -411200, "unspecified exception"},
+      {"AccessDenied", raiser<AccessDenied>(), -52008, "unspecified exception"},
+      {"BoundExceeded", raiser<BoundExceeded>(), -52005, "unspecified exception"},
+      {"BoundExceeded2", raiser<BoundExceeded2>(), -52005, "unspecified exception"},
+      {"BufferOverflow", raiser<BufferOverflow>(), -52000, "unspecified exception"},
+      {"DeserializationError", raiser<DeserializationError>(), -52005, "unspecified exception"},
+      {"FileAlreadyExists", raiser<FileAlreadyExists>(), -52007, "unspecified exception"},
+      {"FileReadFailed", raiser<FileReadFailed>(), -52008, "unspecified exception"},
+      {"FileWriteFailed", raiser<FileWriteFailed>(), -52008, "unspecified exception"},
+      {"InvalidArgument", raiser<InvalidArgument>(), -52005, "unspecified exception"},
+      {"InvalidArgument2", raiser<InvalidArgument2>(), -52005, "unspecified exception"},
+      {"InvalidLocale", raiser<InvalidLocale>(), -52005, "Invalid locale"},
+      {"InvalidOperation", raiser<InvalidOperation>(), -411200, "unspecified exception"},
+      {"InvalidSequence", raiser<InvalidSequence>(), -52005, "unspecified exception"},
+      {"NonexistentException", raiser<NonexistentException>(), -52006, "unspecified exception"},
+      {"ObjectAlreadyExists", raiser<ObjectAlreadyExists>(), -52007, "unspecified exception"},
+      {"OutOfRange", raiser<OutOfRange>(), -52005, "Out of range"},
+      {"OutOfRange2", raiser<OutOfRange2>(), -52005, "Out of range"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    try {
+      c.raiseDefault();
+      FAIL() << "nothing thrown";
+    } catch (const std::exception& caughtAsStd) {
+      const auto* member = dynamic_cast<const Exception*>(&caughtAsStd);
+      ASSERT_NE(member, nullptr);
+      EXPECT_EQ(member->code(), c.code);
+      EXPECT_STREQ(member->what(), c.defaultText);
+      EXPECT_STREQ(member->file(), "");
+      EXPECT_EQ(member->line(), 0);
+    }
+  }
+}
+
+TEST(ExceptionFamily, RaiserDetailsSurviveCopiesAndRefinementsAreCaughtByTheirNamesake) {
+  try {
+    throw OutOfRange2("ko/dsc/Test", 42, "value 300 does not fit");
+  } catch (const OutOfRange& e) {
+    const OutOfRange copy(e);
+    EXPECT_EQ(copy.code(), -52005);
+    EXPECT_STREQ(copy.file(), "ko/dsc/Test");
+    EXPECT_EQ(copy.line(), 42);
+    EXPECT_STREQ(copy.what(), "value 300 does not fit");
+    // Copies share the text, so the pointer handed out stays valid across copies.
+    EXPECT_EQ(copy.what(), e.what());
+  }
+  const InvalidArgument custom(-1, "ko/dsc/Test", 7, "");
+  EXPECT_EQ(custom.code(), -1);
+  EXPECT_STREQ(custom.what(), "unspecified exception");
+  const Exception nullFile(-2, nullptr, 3, "t");
+  EXPECT_STREQ(nullFile.file(), "");
+}
+
+TEST(OsExceptions, PosixErrorNamesTheCallTheSystemTextAndTheNumber) {
+  const osdep::PosixError error("ko/dsc/Test", 9, "open", ENOENT);
+  EXPECT_EQ(error.error(), ENOENT);
+  EXPECT_EQ(error.code(), -52008);
+  EXPECT_EQ(error.line(), 9);
+  EXPECT_EQ(std::string(error.what()), "open: No such file or directory (errno 2)");
+  const Exception& asMember = error;
+  EXPECT_STREQ(asMember.file(), "ko/dsc/Test");
+  const osdep::OSException loader("ko/dsc/SharedLibrary", 1, "dlsym: missing");
+  EXPECT_STREQ(loader.what(), "dlsym: missing");
+}
+
+}  // namespace
+}  // namespace ko::dsc
