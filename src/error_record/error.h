@@ -55,9 +55,12 @@ class Report {
 
  private:
   void writeHeader(const char* constantName, const char* file, int32_t line);
+  // The writing position, at the root's closing brace on first use.
+  char* start();
 
   Status& status_;
   bool taken_;
+  bool started_ = false;
   char* cursor_ = nullptr;
 };
 
