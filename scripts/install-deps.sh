@@ -4,7 +4,7 @@
 set -euo pipefail
 
 packages=(
-  cmake ninja-build g++ pkg-config make
+  cmake ninja-build g++ pkg-config make locales
   libgtest-dev libgmock-dev libbenchmark-dev
   libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev
 )
