@@ -1,0 +1,83 @@
+/* The syncable-device library: one handle per device that takes part in time
+ * synchronisation on this host. A handle remembers its URI and the coherency
+ * requirements last handed to it, and renders itself as a JSON document.
+ *
+ * Every call but kosdlib_SyncableDevice_delete takes an error record as its
+ * last argument: on failure the record gets a negative code and a JSON object
+ * of details; on success it is left as it was.
+ *
+ * Thread-safety: every function may be called on one handle from several
+ * threads at once, except kosdlib_SyncableDevice_delete, which must be the
+ * handle's last call.
+ */
+#ifndef KOSDLIB_KOSDLIB_H_
+#define KOSDLIB_KOSDLIB_H_
+
+#include <stdint.h>
+
+#ifdef __cplusplus
+#include "error_record/status.h"
+typedef koerr::Status kosdlib_Status;
+extern "C" {
+#else
+/* Same layout as the plug-in's error record. */
+typedef struct kosdlib_Status {
+  int32_t code;
+  uint32_t capacity;
+  int (*reallocate)(struct kosdlib_Status* status, uint32_t newCapacity);
+  char* json;
+} kosdlib_Status;
+#endif
+
+#define KOSDLIB_EXPORT __attribute__((visibility("default")))
+
+typedef struct kosdlib_SyncableDevice* kosdlib_SyncableDeviceHandle;
+
+/* A new device for `uri` (non-empty); `kind` names the plug-in that drives it
+ * and shows in the document as "plugin". Null, with -52005 in `status`, when
+ * an argument is missing; null with -52000 when memory runs out. Device
+ * plug-ins call this; applications call the plug-in's own create function. */
+KOSDLIB_EXPORT kosdlib_SyncableDeviceHandle kosdlib_SyncableDevice_create(
+    const char* uri, const char* kind, kosdlib_Status* status);
+
+/* Frees the handle and everything it holds. A null handle is ignored. */
+KOSDLIB_EXPORT void kosdlib_SyncableDevice_delete(kosdlib_SyncableDeviceHandle device);
+
+/* Stores `requirements`, which must be one JSON object, as the device's
+ * coherency requirements (kept without insignificant white space). `scope` is
+ * reserved for future use: pass "". Anything that is not a JSON object fails
+ * with -52005 ("koapalerr_invalidParameter") and the stored requirements stay
+ * as they were. */
+KOSDLIB_EXPORT void kosdlib_SyncableDevice_setCoherencyRequirements(
+    kosdlib_SyncableDeviceHandle device, const char* requirements, const char* scope,
+    kosdlib_Status* status);
+
+/* Forgets the coherency requirements. `scope` as above. */
+KOSDLIB_EXPORT void kosdlib_SyncableDevice_clearCoherencyRequirements(
+    kosdlib_SyncableDeviceHandle device, const char* scope, kosdlib_Status* status);
+
+/* 1 when the device's clock is within `maxOffsetNanos` of its timescale, 0
+ * otherwise. A bound of 0 or less means "the stored requirements": their
+ * member "maxOffsetNanos" when they have one, otherwise the device counts as
+ * coherent. -1 with -52005 for a null handle. */
+KOSDLIB_EXPORT int32_t kosdlib_SyncableDevice_isCoherent(
+    kosdlib_SyncableDeviceHandle device, int32_t maxOffsetNanos, kosdlib_Status* status);
+
+/* The device's URI, owned by the handle and valid until it is deleted. */
+KOSDLIB_EXPORT const char* kosdlib_SyncableDevice_getUri(
+    kosdlib_SyncableDeviceHandle device, kosdlib_Status* status);
+
+/* The device document, allocated with malloc; the caller frees it with free.
+ * Null with -52000 when memory runs out. */
+KOSDLIB_EXPORT char* kosdlib_SyncableDevice_toJson(
+    kosdlib_SyncableDeviceHandle device, kosdlib_Status* status);
+
+/* libkopenduloSdPlugin: the time keeper driven by the local time service. */
+KOSDLIB_EXPORT kosdlib_SyncableDeviceHandle kosdplugins_pendulo_SyncableDeviceActual_create(
+    const char* uri, kosdlib_Status* status);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif /* KOSDLIB_KOSDLIB_H_ */

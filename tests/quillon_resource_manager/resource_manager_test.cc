@@ -1,0 +1,226 @@
+#include "quillon/resource_manager.h"
+
+#include <cJSON.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "error_record/error.h"
+
+namespace {
+
+using ::testing::Return;
+using ::testing::StrictMock;
+using Uris = std::vector<std::string>;
+
+class MockHelpers : public kosdtools::pendulo::TimescaleHelpersInterface {
+ public:
+  MOCK_METHOD(std::string&, replaceSpacesWithDashes, (std::string&), (override));
+  MOCK_METHOD(std::string, normalizeTimescaleUri, (const std::string&), (override));
+  MOCK_METHOD(std::string, getTrGmId, (const std::string&), (override));
+  MOCK_METHOD(std::string, getTimescaleUri, (const std::string&), (override));
+  MOCK_METHOD(std::string, getFirstTrId, (), (override));
+  MOCK_METHOD(std::string, getFirstTrTimescaleUri, (), (override));
+  MOCK_METHOD(Uris, getTimescaleUris, (), (override));
+  MOCK_METHOD(std::string, getFirstTrGmId, (), (override));
+};
+
+class MockDevice : public kosdlib::wrapper::SyncableDeviceInterface {
+ public:
+  MOCK_METHOD(void, setCoherencyRequirements, (const std::string&, const std::string&),
+              (override));
+  MOCK_METHOD(void, clearCoherencyRequirements, (const std::string&), (override));
+  MOCK_METHOD(int32_t, isCoherent, (int32_t), (override));
+  MOCK_METHOD(const char*, getUri, (), (override));
+  MOCK_METHOD(std::string, toJson, (), (override));
+  MOCK_METHOD(kosdlib::wrapper::SyncableDeviceHandle, getHandle, (), (override));
+  MOCK_METHOD(kosdlib::wrapper::SyncableDeviceHandle, getNativeHandle, (), (override));
+};
+
+constexpr const char* kDevice = "/quillon/syncableDevices/pendulo/timekeeper/genericTk";
+
+struct Fixture {
+  std::shared_ptr<StrictMock<MockHelpers>> helpers = std::make_shared<StrictMock<MockHelpers>>();
+  std::shared_ptr<StrictMock<MockDevice>> device = std::make_shared<StrictMock<MockDevice>>();
+  quillon::ResourceManager manager{helpers, device};
+};
+
+// Parses a thrown record and checks its standard head; returns the debug object.
+struct Record {
+  explicit Record(const koerr::Exception& e) : root(cJSON_Parse(e.what())) {}
+  ~Record() { cJSON_Delete(root); }
+  std::vector<std::string> keys(const cJSON* object) const {
+    std::vector<std::string> out;
+    for (const cJSON* c = object ? object->child : nullptr; c; c = c->next) out.push_back(c->string);
+    return out;
+  }
+  std::string text(const cJSON* object, const char* key) const {
+    const cJSON* item = cJSON_GetObjectItemCaseSensitive(object, key);
+    return cJSON_IsString(item) ? item->valuestring : "<missing>";
+  }
+  cJSON* root;
+};
+
+void expectNotFound(const koerr::Exception& e, int line, const std::vector<std::string>& debugKeys) {
+  EXPECT_EQ(e.code(), -52006);
+  Record r(e);
+  ASSERT_NE(r.root, nullptr) << e.what();
+  EXPECT_EQ(r.keys(r.root), (std::vector<std::string>{"error_constant", "file", "line", "component",
+                                                      "kosyncdomain_debug"}));
+  EXPECT_EQ(r.text(r.root, "error_constant"), "koapalerr_resourceNotFound");
+  EXPECT_EQ(r.text(r.root, "file"), "quillon/ResourceManager");
+  EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(r.root, "line")->valueint, line);
+  EXPECT_EQ(r.text(r.root, "component"), "quillon");
+  EXPECT_EQ(r.keys(cJSON_GetObjectItemCaseSensitive(r.root, "kosyncdomain_debug")), debugKeys);
+}
+
+TEST(ResourceListing, EveryFilterAndTimescaleCount) {
+  const std::string d = std::string("{\"uri\":\"") + kDevice + "\"}";
+  struct Case {
+    const char* filter;
+    bool fetchesTimescales;
+    Uris timescales;
+    std::string expected;
+  } cases[] = {
+      {"", true, {"T1", "T2"}, "{\"version\":1,\"resources\":[" + d + ",{\"uri\":\"T1\"},{\"uri\":\"T2\"}]}"},
+      {"", true, {}, "{\"version\":1,\"resources\":[" + d + "]}"},
+      {"syncableDevices", false, {}, "{\"version\":1,\"resources\":[" + d + "]}"},
+      {"timescales", true, {"T1", "T2", "T3"},
+       "{\"version\":1,\"resources\":[{\"uri\":\"T1\"},{\"uri\":\"T2\"},{\"uri\":\"T3\"}]}"},
+      {"timescales", true, {}, "{\"version\":1,\"resources\":]}"},
+      {"SyncableDevices", false, {}, "{\"version\":1,\"resources\":[]}"},
+      {"timescales ", false, {}, "{\"version\":1,\"resources\":[]}"},
+      // URIs go out as they are, quotes and backslashes included.
+      {"timescales", true, {"/a\"b", "c\\d"},
+       "{\"version\":1,\"resources\":[{\"uri\":\"/a\"b\"},{\"uri\":\"c\\d\"}]}"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(std::string("filter '") + c.filter + "'");
+    Fixture f;
+    const bool device = c.filter == std::string() || c.filter == std::string("syncableDevices");
+    EXPECT_CALL(*f.device, getUri).Times(device ? 1 : 0).WillRepeatedly(Return(kDevice));
+    EXPECT_CALL(*f.helpers, getTimescaleUris)
+        .Times(c.fetchesTimescales ? 1 : 0)
+        .WillRepeatedly(Return(c.timescales));
+    EXPECT_EQ(f.manager.getResources(c.filter), c.expected);
+  }
+}
+
+TEST(ResourceListing, DeviceWithoutUriCutsTheDocumentButHelperErrorsStillLeave) {
+  for (const char* filter : {"", "syncableDevices"}) {
+    SCOPED_TRACE(filter);
+    Fixture f;
+    EXPECT_CALL(*f.device, getUri).WillOnce(Return(nullptr));
+    EXPECT_CALL(*f.helpers, getTimescaleUris).Times(*filter ? 0 : 1).WillRepeatedly(Return(Uris{"T"}));
+    EXPECT_EQ(f.manager.getResources(filter), "{\"version\":1,\"resources\":[{\"uri\":\"");
+  }
+  Fixture f;
+  EXPECT_CALL(*f.device, getUri).WillOnce(Return(kDevice));
+  EXPECT_CALL(*f.helpers, getTimescaleUris).WillOnce([]() -> Uris {
+    koerr::Error(-52004, "jsonErrorsNotAnArray", "x/y", 7, "kosync_debug").add("key", "v").raise();
+  });
+  try {
+    (void)f.manager.getResources("");
+    FAIL() << "no error";
+  } catch (const koerr::Exception& e) {
+    EXPECT_EQ(e.code(), -52004);
+    EXPECT_STREQ(e.what(),
+                 "{\"error_constant\":\"jsonErrorsNotAnArray\",\"file\":\"x/y\",\"line\":7,"
+                 "\"component\":\"quillon\",\"kosync_debug\":{\"key\":\"v\"}}");
+  }
+}
+
+TEST(DeviceResource, OnlyTheExactUriIsFoundForGetAndPut) {
+  const std::string exact = kDevice;
+  {
+    Fixture f;
+    EXPECT_CALL(*f.device, getUri).WillRepeatedly(Return(kDevice));
+    EXPECT_CALL(*f.device, toJson).WillOnce(Return("{\"from\":\"library\"}"));
+    EXPECT_EQ(f.manager.getSyncableDevice(exact), "{\"from\":\"library\"}");
+    const std::string body = " {\"maxOffsetNanos\" : 1000}\n";
+    EXPECT_CALL(*f.device, setCoherencyRequirements(body, std::string()));
+    f.manager.putSyncableDevice(exact, body);
+  }
+  for (const std::string& wrong : {exact + "/", exact.substr(0, exact.size() - 1), std::string(),
+                                   std::string("/QUILLON") + exact.substr(8), " " + exact}) {
+    SCOPED_TRACE(wrong);
+    for (int line : {75, 127}) {
+      Fixture f;
+      EXPECT_CALL(*f.device, getUri).WillRepeatedly(Return(kDevice));
+      try {
+        if (line == 75) {
+          (void)f.manager.getSyncableDevice(wrong);
+        } else {
+          f.manager.putSyncableDevice(wrong, "{}");
+        }
+        FAIL() << "found";
+      } catch (const koerr::Exception& e) {
+        expectNotFound(e, line, {"message", "localDeviceUri", "onlyDeviceUri"});
+        Record r(e);
+        const cJSON* debug = cJSON_GetObjectItemCaseSensitive(r.root, "kosyncdomain_debug");
+        EXPECT_EQ(r.text(debug, "message"), "Requested syncableDeviceUri does not exist on this host.");
+        EXPECT_EQ(r.text(debug, "localDeviceUri"), wrong);
+        EXPECT_EQ(r.text(debug, "onlyDeviceUri"), exact);
+      }
+    }
+  }
+}
+
+TEST(TimescaleResource, FoundUriYieldsGrandmasterFromItsLastSegment) {
+  struct Case {
+    std::string uri;
+    std::string grandmaster;
+  } cases[] = {
+      {"/quillon/timescales/pendulo/tr0/00-80-2F-FF-FE-12-34-56", "00:80:2f:ff:fe:12:34:56"},
+      {"No-Slash-AB", "no:slash:ab"},
+      {"/quillon/timescales/pendulo/tr0/", ""},
+      {"/a/Aa:Bb-c\xC3\x84", "aa:bb:c\xC3\x84"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.uri);
+    Fixture f;
+    EXPECT_CALL(*f.helpers, getTimescaleUris).WillOnce(Return(Uris{"/first", c.uri, "/third"}));
+    EXPECT_EQ(f.manager.getTimescale(c.uri), "{\"version\":1,\"uri\":\"" + c.uri +
+                                                 "\",\"data\":{\"grandmasterId\":\"" +
+                                                 c.grandmaster + "\"}}");
+  }
+}
+
+TEST(TimescaleResource, UnknownUriListsTheCurrentOnesRaw) {
+  struct Case {
+    std::string requested;
+    Uris current;
+    std::string list;
+  } cases[] = {
+      {"/quillon/timescales/pendulo/TR0/gm", {"/quillon/timescales/pendulo/tr0/gm", "/x"},
+       "[\"/quillon/timescales/pendulo/tr0/gm\",\"/x\"]"},
+      {"/x/", {"/x"}, "[\"/x\"]"},
+      {"/x", {}, "[]"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.requested);
+    Fixture f;
+    EXPECT_CALL(*f.helpers, getTimescaleUris).WillOnce(Return(c.current));
+    try {
+      (void)f.manager.getTimescale(c.requested);
+      FAIL() << "found";
+    } catch (const koerr::Exception& e) {
+      expectNotFound(e, 98, {"message", "localTimescaleUri", "currentTimescaleUris"});
+      Record r(e);
+      const cJSON* debug = cJSON_GetObjectItemCaseSensitive(r.root, "kosyncdomain_debug");
+      EXPECT_EQ(r.text(debug, "message"),
+                "Requested timescaleUri does not match any timescaleUri on the system");
+      EXPECT_EQ(r.text(debug, "localTimescaleUri"), c.requested);
+      const cJSON* list = cJSON_GetObjectItemCaseSensitive(debug, "currentTimescaleUris");
+      ASSERT_TRUE(cJSON_IsArray(list));
+      char* printed = cJSON_PrintUnformatted(list);
+      EXPECT_EQ(printed, c.list);
+      cJSON_free(printed);
+    }
+  }
+}
+
+}  // namespace

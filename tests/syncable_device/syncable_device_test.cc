@@ -1,0 +1,129 @@
+// The wrapper over the real device library: documents, requirements and the
+// library's own failure records.
+#include <cJSON.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <atomic>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "error_record/exception.h"
+#include "syncable_device/syncable_device_actual.h"
+
+namespace {
+
+using kosdplugins::pendulo::wrapper::SyncableDeviceActual;
+
+constexpr const char* kUri = "/quillon/syncableDevices/pendulo/timekeeper/genericTk";
+
+std::string document(const std::string& requirements, bool coherent) {
+  return std::string("{\"uri\":\"") + kUri + "\",\"coherencyRequirements\":" + requirements +
+         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") +
+         ",\"offsetNanos\":250}";
+}
+
+std::string debugMessage(const koerr::Exception& e) {
+  cJSON* root = cJSON_Parse(e.what());
+  const cJSON* debug = cJSON_GetObjectItemCaseSensitive(root, "kosdlib_debug");
+  const cJSON* message = cJSON_GetObjectItemCaseSensitive(debug, "message");
+  const cJSON* constant = cJSON_GetObjectItemCaseSensitive(root, "error_constant");
+  std::string out = std::string(cJSON_IsString(constant) ? constant->valuestring : "?") + ": " +
+                    (cJSON_IsString(message) ? message->valuestring : "?");
+  cJSON_Delete(root);
+  return out;
+}
+
+TEST(SyncableDevice, RequirementsAreStoredMinifiedAndShapeTheDocument) {
+  SyncableDeviceActual device(kUri);
+  EXPECT_STREQ(device.getUri(), kUri);
+  EXPECT_NE(device.getHandle(), nullptr);
+  EXPECT_EQ(device.getHandle(), device.getNativeHandle());
+  EXPECT_EQ(device.toJson(), document("null", true));
+
+  device.setCoherencyRequirements(" {\n \"maxOffsetNanos\" : 1000, \"note\": \"a b\"}\t", "");
+  EXPECT_EQ(device.toJson(), document("{\"maxOffsetNanos\":1000,\"note\":\"a b\"}", true));
+  EXPECT_EQ(device.isCoherent(0), 1);
+  EXPECT_EQ(device.isCoherent(100), 0);
+
+  device.setCoherencyRequirements("{\"maxOffsetNanos\":100}", "");
+  EXPECT_EQ(device.toJson(), document("{\"maxOffsetNanos\":100}", false));
+  EXPECT_EQ(device.isCoherent(0), 0);
+  EXPECT_EQ(device.isCoherent(250), 1);
+
+  device.clearCoherencyRequirements("");
+  EXPECT_EQ(device.toJson(), document("null", true));
+}
+
+TEST(SyncableDevice, BadRequirementsFailWithTheLibraryRecordAndKeepTheOldOnes) {
+  SyncableDeviceActual device(kUri);
+  device.setCoherencyRequirements("{\"maxOffsetNanos\":1000}", "");
+  struct Case {
+    const char* text;
+    const char* message;
+  } cases[] = {
+      {"", "The coherency requirements are not valid JSON."},
+      {"maxOffsetNanos=1", "The coherency requirements are not valid JSON."},
+      {"{\"a\":1} {}", "The coherency requirements are not valid JSON."},
+      {"{\"a\":", "The coherency requirements are not valid JSON."},
+      {"[{\"a\":1}]", "The coherency requirements must be a JSON object."},
+      {"\"{}\"", "The coherency requirements must be a JSON object."},
+      {"null", "The coherency requirements must be a JSON object."},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.text);
+    try {
+      device.setCoherencyRequirements(c.text, "");
+      FAIL() << "accepted";
+    } catch (const koerr::Exception& e) {
+      EXPECT_EQ(e.code(), -52005);
+      EXPECT_EQ(debugMessage(e), std::string("koapalerr_invalidParameter: ") + c.message);
+    }
+    EXPECT_EQ(device.toJson(), document("{\"maxOffsetNanos\":1000}", true));
+  }
+}
+
+TEST(SyncableDevice, CreationFailureThrowsAndUrisAreEscapedInTheDocument) {
+  try {
+    SyncableDeviceActual device("");
+    FAIL() << "created";
+  } catch (const koerr::Exception& e) {
+    EXPECT_EQ(e.code(), -52005);
+    EXPECT_EQ(debugMessage(e), "koapalerr_invalidParameter: The device URI is missing or empty.");
+  }
+  SyncableDeviceActual odd("/a\"b\\c\x01");
+  EXPECT_STREQ(odd.getUri(), "/a\"b\\c\x01");
+  cJSON* root = cJSON_Parse(odd.toJson().c_str());
+  ASSERT_NE(root, nullptr);
+  EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(root, "uri")->valuestring, "/a\"b\\c\x01");
+  cJSON_Delete(root);
+}
+
+// Readers racing a writer only ever see one of the documents it writes.
+TEST(SyncableDevice, ConcurrentWritersAndReadersSeeWholeDocuments) {
+  SyncableDeviceActual device(kUri);
+  const std::vector<std::string> allowed = {document("null", true),
+                                            document("{\"maxOffsetNanos\":100}", false),
+                                            document("{\"maxOffsetNanos\":1000}", true)};
+  std::atomic<int> bad{0};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&, t] {
+      for (int i = 0; i < 300; ++i) {
+        if (t == 0) {
+          device.setCoherencyRequirements(i % 2 ? "{\"maxOffsetNanos\":100}" : "{\"maxOffsetNanos\":1000}", "");
+        } else if (t == 1 && i % 7 == 0) {
+          device.clearCoherencyRequirements("");
+        } else {
+          const std::string text = device.toJson();
+          if (std::find(allowed.begin(), allowed.end(), text) == allowed.end()) ++bad;
+        }
+      }
+    });
+  }
+  for (auto& t : threads) t.join();
+  EXPECT_EQ(bad.load(), 0);
+}
+
+}  // namespace
