@@ -101,10 +101,10 @@ TEST(ResourceListing, EveryFilterAndTimescaleCount) {
     SCOPED_TRACE(std::string("filter '") + c.filter + "'");
     Fixture f;
     const bool device = c.filter == std::string() || c.filter == std::string("syncableDevices");
-    EXPECT_CALL(*f.device, getUri).Times(device ? 1 : 0).WillRepeatedly(Return(kDevice));
-    EXPECT_CALL(*f.helpers, getTimescaleUris)
-        .Times(c.fetchesTimescales ? 1 : 0)
-        .WillRepeatedly(Return(c.timescales));
+    ON_CALL(*f.device, getUri).WillByDefault(Return(kDevice));
+    ON_CALL(*f.helpers, getTimescaleUris).WillByDefault(Return(c.timescales));
+    EXPECT_CALL(*f.device, getUri).Times(device ? 1 : 0);
+    EXPECT_CALL(*f.helpers, getTimescaleUris).Times(c.fetchesTimescales ? 1 : 0);
     EXPECT_EQ(f.manager.getResources(c.filter), c.expected);
   }
 }
@@ -114,7 +114,8 @@ TEST(ResourceListing, DeviceWithoutUriCutsTheDocumentButHelperErrorsStillLeave) 
     SCOPED_TRACE(filter);
     Fixture f;
     EXPECT_CALL(*f.device, getUri).WillOnce(Return(nullptr));
-    EXPECT_CALL(*f.helpers, getTimescaleUris).Times(*filter ? 0 : 1).WillRepeatedly(Return(Uris{"T"}));
+    ON_CALL(*f.helpers, getTimescaleUris).WillByDefault(Return(Uris{"T"}));
+    EXPECT_CALL(*f.helpers, getTimescaleUris).Times(*filter ? 0 : 1);
     EXPECT_EQ(f.manager.getResources(filter), "{\"version\":1,\"resources\":[{\"uri\":\"");
   }
   Fixture f;
