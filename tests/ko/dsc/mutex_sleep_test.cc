@@ -1,0 +1,180 @@
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "ko/dsc/osdep/realtime_kernel.h"
+#include "ko/dsc/osdep/recursive_mutex.h"
+#include "ko/dsc/osdep/sleep.h"
+
+namespace ko::dsc::osdep {
+namespace {
+
+// A flag file in a fresh temporary directory; `content` null means no file.
+class FlagFile {
+ public:
+  explicit FlagFile(const char* content) {
+    char dir[] = "/tmp/ko_dsc_rt_XXXXXX";
+    dir_ = mkdtemp(dir);
+    path_ = dir_ + "/realtime";
+    if (content != nullptr) {
+      write(content);
+    }
+  }
+  ~FlagFile() {
+    std::remove(path_.c_str());
+    rmdir(dir_.c_str());
+  }
+  void write(const std::string& content) const {
+    FILE* f = std::fopen(path_.c_str(), "w");
+    std::fputs(content.c_str(), f);
+    std::fclose(f);
+  }
+  const std::string& path() const { return path_; }
+
+ private:
+  std::string dir_;
+  std::string path_;
+};
+
+TEST(RealtimeKernel, OnlyALeadingOneMeansRealtimeAndTheAnswerIsReadOnce) {
+  const struct {
+    const char* content;
+    bool realtime;
+  } cases[] = {{nullptr, false}, {"", false}, {"0", false}, {"0\n", false},
+               {"x", false},     {"1", true},  {"1\n", true}, {"10", true}};
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.content == nullptr ? "<no file>" : c.content);
+    const FlagFile flag(c.content);
+    const RealtimeKernel kernel(flag.path());
+    EXPECT_EQ(kernel.isRealtime(), c.realtime);
+    // The protocol follows the kernel.
+    EXPECT_EQ(RecursiveMutex(kernel).inheritsPriority(), c.realtime);
+    flag.write(c.realtime ? "0" : "1");
+    EXPECT_EQ(kernel.isRealtime(), c.realtime) << "answer must be cached";
+  }
+}
+
+TEST(RealtimeKernel, ConcurrentFirstUseGivesEveryMutexTheSameProtocol) {
+  const FlagFile flag("1");
+  const RealtimeKernel kernel(flag.path());
+  std::vector<std::thread> threads;
+  std::vector<char> inherits(8, 0);
+  for (size_t i = 0; i < inherits.size(); ++i) {
+    threads.emplace_back([&, i] { inherits[i] = RecursiveMutex(kernel).inheritsPriority(); });
+  }
+  for (auto& t : threads) {
+    t.join();
+  }
+  for (char each : inherits) {
+    EXPECT_TRUE(each);
+  }
+}
+
+TEST(RecursiveMutex, NestsForItsOwnerAndIgnoresUnlockFromOtherThreads) {
+  const FlagFile flag(nullptr);
+  const RealtimeKernel kernel(flag.path());
+  RecursiveMutex mutex(kernel);
+  EXPECT_EQ(mutex.owner(), pthread_t{0});
+  mutex.lock();
+  mutex.lock();
+  EXPECT_TRUE(pthread_equal(mutex.owner(), pthread_self()));
+  EXPECT_EQ(mutex.count(), 2);
+
+  std::thread([&] { mutex.unlock(); }).join();
+  EXPECT_EQ(mutex.count(), 2);
+  EXPECT_TRUE(pthread_equal(mutex.owner(), pthread_self()));
+
+  mutex.unlock();
+  EXPECT_EQ(mutex.count(), 1);
+  EXPECT_TRUE(pthread_equal(mutex.owner(), pthread_self()));
+  mutex.unlock();
+  EXPECT_EQ(mutex.count(), 0);
+  EXPECT_EQ(mutex.owner(), pthread_t{0});
+  // A second release by the former owner finds no owner and does nothing.
+  mutex.unlock();
+  EXPECT_EQ(mutex.count(), 0);
+}
+
+TEST(RecursiveMutex, ExcludesOtherThreads) {
+  RecursiveMutex mutex;
+  long counter = 0;
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 5000; ++i) {
+        std::lock_guard<RecursiveMutex> outer(mutex);
+        std::lock_guard<RecursiveMutex> inner(mutex);
+        const long seen = counter;
+        counter = seen + 1;
+      }
+    });
+  }
+  for (auto& t : threads) {
+    t.join();
+  }
+  EXPECT_EQ(counter, 20000);
+  EXPECT_EQ(mutex.count(), 0);
+}
+
+// Staged clock_nanosleep: records each request and plays back the answers.
+struct StagedSleep {
+  struct Answer {
+    int rc;
+    timespec remaining;
+  };
+  static inline std::vector<Answer> answers;
+  static inline std::vector<timespec> requests;
+  static inline std::vector<std::pair<clockid_t, int>> clocks;
+
+  static int call(clockid_t clock, int flags, const timespec* request, timespec* remaining) {
+    clocks.emplace_back(clock, flags);
+    requests.push_back(*request);
+    const Answer answer = answers.at(requests.size() - 1);
+    if (answer.rc == EINTR) {
+      *remaining = answer.remaining;
+    }
+    return answer.rc;
+  }
+};
+
+TEST(Sleep, ResumesWithTheRemainderAfterSignalsAndStopsOnOtherErrors) {
+  const struct {
+    const char* name;
+    uint32_t milliseconds;
+    std::vector<StagedSleep::Answer> answers;
+    std::vector<timespec> expectedRequests;
+  } cases[] = {
+      {"uninterrupted", 1500, {{0, {}}}, {{1, 500000000}}},
+      {"below one second", 999, {{0, {}}}, {{0, 999000000}}},
+      {"zero", 0, {{0, {}}}, {{0, 0}}},
+      {"largest", 4294967295U, {{0, {}}}, {{4294967, 295000000}}},
+      {"two signals",
+       1500,
+       {{EINTR, {0, 700000000}}, {EINTR, {0, 100}}, {0, {}}},
+       {{1, 500000000}, {0, 700000000}, {0, 100}}},
+      {"other error", 1500, {{EINVAL, {}}}, {{1, 500000000}}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    StagedSleep::answers = c.answers;
+    StagedSleep::requests.clear();
+    StagedSleep::clocks.clear();
+    sleepMilliseconds(c.milliseconds, &StagedSleep::call);
+    ASSERT_EQ(StagedSleep::requests.size(), c.expectedRequests.size());
+    for (size_t i = 0; i < c.expectedRequests.size(); ++i) {
+      EXPECT_EQ(StagedSleep::requests[i].tv_sec, c.expectedRequests[i].tv_sec) << i;
+      EXPECT_EQ(StagedSleep::requests[i].tv_nsec, c.expectedRequests[i].tv_nsec) << i;
+      EXPECT_EQ(StagedSleep::clocks[i].first, CLOCK_MONOTONIC);
+      EXPECT_EQ(StagedSleep::clocks[i].second, 0) << "must be a relative sleep";
+    }
+  }
+}
+
+}  // namespace
+}  // namespace ko::dsc::osdep

@@ -1,0 +1,76 @@
+#include "ko/dsc/osdep/shared_library.h"
+
+#include <gtest/gtest.h>
+#include <stdlib.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cmath>
+#include <cstdio>
+#include <string>
+
+#include "ko/dsc/osdep/os_exception.h"
+
+namespace ko::dsc::osdep {
+namespace {
+
+TEST(LibrarySearchPath, ComponentFolderFirstThenDirectoryThenTheSystemLoader) {
+  char base[] = "/tmp/ko_dsc_lib_XXXXXX";
+  const std::string dir = mkdtemp(base);
+  const std::string other = dir + "/other";
+  ASSERT_EQ(mkdir(other.c_str(), 0700), 0);
+  ASSERT_EQ(mkdir((other + "/kocurl").c_str(), 0700), 0);
+  auto touch = [](const std::string& path) { std::fclose(std::fopen(path.c_str(), "w")); };
+  touch(dir + "/libx.so.13");
+  touch(other + "/kocurl/libx.so.13");
+
+  const LibrarySearchPath path({dir + "/missing", other, dir});
+  EXPECT_EQ(path.locate("kocurl", "libx.so.13"), other + "/kocurl/libx.so.13");
+  EXPECT_EQ(path.locate("kossl", "libx.so.13"), dir + "/libx.so.13");
+  EXPECT_EQ(path.locate("kossl", "liby.so.13"), "liby.so.13");
+
+  setenv(LibrarySearchPath::kVariable, (":" + other + "::" + dir + ":").c_str(), 1);
+  EXPECT_EQ(LibrarySearchPath::fromEnvironment().locate("kocurl", "libx.so.13"),
+            other + "/kocurl/libx.so.13");
+  unsetenv(LibrarySearchPath::kVariable);
+  EXPECT_EQ(LibrarySearchPath::fromEnvironment().locate("kocurl", "libx.so.13"), "libx.so.13");
+
+  std::remove((other + "/kocurl/libx.so.13").c_str());
+  std::remove((dir + "/libx.so.13").c_str());
+  rmdir((other + "/kocurl").c_str());
+  rmdir(other.c_str());
+  rmdir(dir.c_str());
+}
+
+TEST(SharedLibrary, ResolvesSymbolsAndRaisesOSExceptionWithTheLoaderText) {
+  const SharedLibrary math(L"system", L"m", 6, LibrarySearchPath());
+  ASSERT_TRUE(math.isLoaded()) << math.loaderError();
+  EXPECT_EQ(math.path(), "libm.so.6");
+  auto* cosine = reinterpret_cast<double (*)(double)>(math.symbol("cos"));
+  EXPECT_DOUBLE_EQ(cosine(0.0), 1.0);
+  try {
+    (void)math.symbol("no_such_symbol_here");
+    FAIL() << "no exception";
+  } catch (const OSException& e) {
+    EXPECT_EQ(e.code(), -52008);
+    EXPECT_STREQ(e.file(), "ko/dsc/osdep/SharedLibrary");
+    EXPECT_EQ(std::string(e.what()).rfind("dlsym(no_such_symbol_here) in libm.so.6: ", 0), 0u)
+        << e.what();
+  }
+
+  const SharedLibrary absent(L"kocurl", L"ko_dsc_absent", 13, LibrarySearchPath());
+  EXPECT_FALSE(absent.isLoaded());
+  EXPECT_EQ(absent.loaderError().rfind("dlopen(libko_dsc_absent.so.13): ", 0), 0u)
+      << absent.loaderError();
+  try {
+    (void)absent.symbol("curl_easy_init");
+    FAIL() << "no exception";
+  } catch (const OSException& e) {
+    EXPECT_EQ(std::string(e.what()).rfind("dlsym(curl_easy_init): library kocurl not loaded: dlopen(", 0),
+              0u)
+        << e.what();
+  }
+}
+
+}  // namespace
+}  // namespace ko::dsc::osdep
