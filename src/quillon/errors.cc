@@ -1,0 +1,85 @@
+#include "quillon/errors.h"
+
+#include <cstdlib>
+#include <cstring>
+#include <exception>
+
+#include "error_record/constants.h"
+#include "error_record/error.h"
+#include "error_record/exception.h"
+#include "ko/dsc/exception.h"
+#include "koxlator/errors_parser.h"
+
+namespace quillon {
+namespace {
+
+constexpr uint32_t kEnvelopeStartSize = 256;
+
+// The lookup clears its output before searching, so the preset survives only
+// a lookup that never ran; whether found or not, the lookup's own troubles
+// are no concern of the answer.
+std::string errorText(int32_t code) {
+  if (code == 0) {
+    return std::string();
+  }
+  std::string text = "Unknown Error";
+  koerr::Status lookupStatus;
+  std::string directory;
+  koxlator::errorsDirectory(directory, lookupStatus);
+  koxlator::lookupExplanation(directory, code, koxlator::kEnglish, text, lookupStatus);
+  koerr::releaseText(lookupStatus);
+  return text;
+}
+
+// An envelope starts small and grows by doubling through the record's
+// reallocate function, the way every record does.
+koerr::Status envelopeBuffer() {
+  koerr::Status envelope;
+  char* buffer = static_cast<char*>(std::calloc(kEnvelopeStartSize, 1));
+  if (buffer != nullptr) {
+    std::memcpy(buffer, "{}", 2);
+    buffer[kEnvelopeStartSize - 1] = koerr::kGuard;
+    envelope.capacity = kEnvelopeStartSize;
+    envelope.json = buffer;
+  }
+  return envelope;
+}
+
+}  // namespace
+
+std::string buildEnvelope(const koerr::Status& status, const std::string& result) {
+  const std::string text = errorText(status.code);
+  koerr::Status envelope = envelopeBuffer();
+  char* cursor = koerr::beginJson(envelope, 2);
+  cursor = koerr::addObject(cursor, "error", envelope);
+  cursor = koerr::addBool(cursor, "success", status.code == 0, envelope);
+  cursor = koerr::addInt(cursor, "errorCode", status.code, envelope);
+  cursor = koerr::addStdString(cursor, "errorText", text, envelope);
+  if (status.json != nullptr) {
+    cursor = koerr::addString(cursor, "errorInfo", status.json, envelope);
+  }
+  cursor = koerr::leaveContainer(cursor);
+  if (!result.empty()) {
+    cursor = koerr::addRawValue(cursor, "result", result.c_str(), envelope);
+  }
+  std::string answer = envelope.json != nullptr ? envelope.json : "";
+  koerr::releaseText(envelope);
+  return answer;
+}
+
+void translateCurrentException(koerr::Status& status) {
+  try {
+    throw;
+  } catch (const koerr::ExceptionBase& caught) {
+    koerr::copyStatusKeepSource(status, caught.status());
+  } catch (const ko::dsc::exception::Exception& caught) {
+    koerr::Report(status, caught.code()).location(caught.file(), caught.line());
+  } catch (const std::exception& caught) {
+    koerr::Report(status, koerr::kQuillonInternalSoftwareError, "quillon/errors", 50)
+        .open("quillon_debug")
+        .add("std::exception", caught.what())
+        .close();
+  }
+}
+
+}  // namespace quillon
