@@ -60,9 +60,7 @@ void reportMemoryFull(koerr::Status& status) {
 void appendLine(std::string& text, const char* line, koerr::Status& status) {
   try {
     text.append(line);
-  } catch (const std::bad_alloc&) {
-    reportMemoryFull(status);
-  } catch (const std::length_error&) {
+  } catch (const std::exception&) {  // bad_alloc or length_error
     reportMemoryFull(status);
   }
 }
