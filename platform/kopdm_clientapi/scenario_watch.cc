@@ -1,0 +1,85 @@
+#include "scenario_watch.h"
+
+#include <poll.h>
+#include <sys/eventfd.h>
+#include <sys/inotify.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+namespace kopdmsim {
+namespace {
+
+// Plain writes show up once, at close, so a half-written file is never read.
+constexpr uint32_t kEvents =
+    IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB;
+
+std::string directoryOf(const std::string& path) {
+  const std::size_t slash = path.rfind('/');
+  if (slash == std::string::npos) return ".";
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+std::string nameOf(const std::string& path) {
+  const std::size_t slash = path.rfind('/');
+  return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+}  // namespace
+
+ScenarioWatch::ScenarioWatch(const std::string& path, OnChange onChange)
+    : name_(nameOf(path)), onChange_(std::move(onChange)) {
+  inotifyFd_ = inotify_init1(IN_CLOEXEC | IN_NONBLOCK);
+  stopFd_ = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
+  if (inotifyFd_ < 0 || stopFd_ < 0) {
+    problem_ = std::string("inotify_init1/eventfd: ") + std::strerror(errno);
+    return;
+  }
+  if (inotify_add_watch(inotifyFd_, directoryOf(path).c_str(), kEvents) < 0) {
+    problem_ = "inotify_add_watch(" + directoryOf(path) + "): " + std::strerror(errno);
+    return;
+  }
+  thread_ = std::thread(&ScenarioWatch::run, this);
+}
+
+ScenarioWatch::~ScenarioWatch() {
+  if (thread_.joinable()) {
+    const uint64_t one = 1;
+    (void)!write(stopFd_, &one, sizeof one);
+    thread_.join();
+  }
+  if (inotifyFd_ >= 0) close(inotifyFd_);
+  if (stopFd_ >= 0) close(stopFd_);
+}
+
+void ScenarioWatch::run() {
+  alignas(struct inotify_event) char events[4096];
+  for (;;) {
+    pollfd fds[2] = {{inotifyFd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
+    if (poll(fds, 2, -1) < 0) {
+      if (errno == EINTR) continue;
+      return;
+    }
+    if (fds[1].revents != 0) return;
+    bool changed = false;
+    for (;;) {
+      const ssize_t length = read(inotifyFd_, events, sizeof events);
+      if (length <= 0) break;
+      changed = changed || concernsFile(events, length);
+    }
+    if (changed) onChange_();
+  }
+}
+
+bool ScenarioWatch::concernsFile(const char* events, long length) const {
+  for (long offset = 0; offset < length;) {
+    const auto* event = reinterpret_cast<const struct inotify_event*>(events + offset);
+    if ((event->mask & IN_Q_OVERFLOW) != 0) return true;
+    if (event->len > 0 && name_ == event->name) return true;
+    offset += static_cast<long>(sizeof(struct inotify_event) + event->len);
+  }
+  return false;
+}
+
+}  // namespace kopdmsim

@@ -1,0 +1,429 @@
+#include "time_service.h"
+
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <mutex>
+
+#include "default_scenario.h"
+#include "error_record/error.h"
+#include "service_codes.h"
+
+namespace kopdmsim {
+namespace {
+
+constexpr const char* kFile = "kopdm_clientapi/timeService";
+constexpr const char* kChannel = "kopdmclientapi_debug";
+// A scenario is a hand-written file; anything larger is a mistake.
+constexpr long kMaxScenarioBytes = 16L * 1024 * 1024;
+
+bool readFile(const std::string& path, std::string* text, std::string* problem) {
+  FILE* file = std::fopen(path.c_str(), "rb");
+  if (file == nullptr) {
+    *problem = std::string("cannot be opened: ") + std::strerror(errno);
+    return false;
+  }
+  char chunk[8192];
+  size_t count;
+  while ((count = std::fread(chunk, 1, sizeof chunk, file)) > 0) {
+    text->append(chunk, count);
+    if (static_cast<long>(text->size()) > kMaxScenarioBytes) {
+      std::fclose(file);
+      *problem = "is larger than 16 MiB";
+      return false;
+    }
+  }
+  const bool failed = std::ferror(file) != 0;
+  std::fclose(file);
+  if (failed) *problem = "cannot be read";
+  return !failed;
+}
+
+void copyAnswer(const std::string& answer, char* buffer, uint32_t capacity) {
+  const size_t length = answer.size() < capacity ? answer.size() : capacity - 1;
+  std::memcpy(buffer, answer.data(), length);
+  buffer[length] = '\0';
+}
+
+}  // namespace
+
+struct TimeService::Answer {
+  const std::string* text;
+  int32_t code;  // set when the lookup reported an error
+};
+
+bool TimeService::FileStamp::operator==(const FileStamp& other) const {
+  return exists == other.exists && device == other.device && inode == other.inode &&
+         size == other.size && modified.tv_sec == other.modified.tv_sec &&
+         modified.tv_nsec == other.modified.tv_nsec;
+}
+
+TimeService::TimeService(std::string path) : path_(std::move(path)) {
+  if (!path_.empty()) {
+    watch_ = std::make_unique<ScenarioWatch>(path_, [this] { reload(); });
+    pollFile_ = !watch_->active();
+  }
+  // Loaded after the watch exists, so an edit in between is not missed.
+  state_ = loadState();
+}
+
+TimeService::~TimeService() { watch_.reset(); }
+
+TimeService::FileStamp TimeService::stampOf(const std::string& path) {
+  FileStamp stamp;
+  struct stat info;
+  if (::stat(path.c_str(), &info) == 0) {
+    stamp.exists = true;
+    stamp.device = info.st_dev;
+    stamp.inode = info.st_ino;
+    stamp.size = info.st_size;
+    stamp.modified = info.st_mtim;
+  }
+  return stamp;
+}
+
+TimeService::State TimeService::loadState() const {
+  State state;
+  std::string text;
+  if (path_.empty()) {
+    text = defaultScenarioText();
+  } else {
+    state.stamp = stampOf(path_);
+    if (!readFile(path_, &text, &state.problem)) return state;
+  }
+  state.usable = parseScenario(text, &state.live, &state.problem);
+  state.saved = state.live.trs;
+  return state;
+}
+
+void TimeService::reload() {
+  State fresh = loadState();
+  std::unique_lock<std::shared_mutex> lock(mutex_);
+  state_ = std::move(fresh);
+}
+
+void TimeService::reloadIfFileChanged() {
+  const FileStamp now = stampOf(path_);
+  {
+    std::shared_lock<std::shared_mutex> lock(mutex_);
+    if (now == state_.stamp) return;
+  }
+  reload();
+}
+
+const char* TimeService::sourceName() const {
+  return path_.empty() ? "(built-in default scenario)" : path_.c_str();
+}
+
+int32_t TimeService::unavailable(const State& state, Call call, koerr::Status& status) const {
+  if (!state.usable) {
+    koerr::Report(status, kScenarioUnusable, "kopdmclientapi_scenarioUnusable", kFile, __LINE__)
+        .open(kChannel)
+        .add("message", "The scenario file " + state.problem + ".")
+        .add("scenarioFile", sourceName())
+        .add("call", callName(call))
+        .close();
+    return kScenarioUnusable;
+  }
+  if (!state.up) {
+    koerr::Report(status, kServiceDown, "kopdmclientapi_serviceDown", kFile, __LINE__)
+        .open(kChannel)
+        .add("message", "The time-sync manager service is down.")
+        .add("call", callName(call))
+        .close();
+    return kServiceDown;
+  }
+  return 0;
+}
+
+int32_t TimeService::reportInvalidArgument(koerr::Status& status, Call call,
+                                           const char* problem) const {
+  koerr::Report(status, kInvalidArgument, "kopdmclientapi_invalidArgument", kFile, __LINE__)
+      .open(kChannel)
+      .add("message", problem)
+      .add("call", callName(call))
+      .close();
+  return kInvalidArgument;
+}
+
+int32_t TimeService::reportFault(koerr::Status& status, const Fault& fault,
+                                 std::string_view trId, std::string_view key) const {
+  koerr::Report report(status, fault.code, "kopdmclientapi_injectedFault", kFile, __LINE__);
+  report.open(kChannel)
+      .add("message", "Fault injected by the scenario.")
+      .add("scenarioFile", sourceName())
+      .addUInt("fault", static_cast<uint32_t>(fault.index))
+      .add("call", callName(fault.call));
+  if (fault.matchesTrId) report.add("trId", std::string(trId));
+  if (fault.matchesKey) report.add("key", std::string(key));
+  report.close();
+  return fault.code;
+}
+
+int32_t TimeService::reportNoTr(koerr::Status& status, Call call, std::string_view trId) const {
+  koerr::Report(status, kTrDoesNotExist, "kopdmclientapi_trDoesNotExist", kFile, __LINE__)
+      .open(kChannel)
+      .add("message", "The time reference does not exist.")
+      .add("call", callName(call))
+      .add("trId", std::string(trId))
+      .close();
+  return kTrDoesNotExist;
+}
+
+int32_t TimeService::reportNoAttr(koerr::Status& status, Call call, std::string_view trId,
+                                  std::string_view key) const {
+  koerr::Report report(status, kAttrNotSet, "kopdmclientapi_attrNotSet", kFile, __LINE__);
+  report.open(kChannel).add("message", "The attribute is unknown or not set.").add("call",
+                                                                                   callName(call));
+  if (!trId.empty()) report.add("trId", std::string(trId));
+  report.add("attrKey", std::string(key)).close();
+  return kAttrNotSet;
+}
+
+int32_t TimeService::serveText(const Answer& answer, const Fault* fault, std::string_view trId,
+                               std::string_view key, char* buffer, uint32_t capacity,
+                               koerr::Status& status) const {
+  const std::string* text = fault != nullptr && fault->replacesAnswer ? &fault->answer : answer.text;
+  if (text == nullptr) return answer.code;
+  copyAnswer(*text, buffer, capacity);
+  // A fault that only replaces the answer is no warning.
+  return fault != nullptr && fault->code > 0 ? reportFault(status, *fault, trId, key) : 0;
+}
+
+int32_t TimeService::getApiVersion() {
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (!state_.usable) return kScenarioUnusable;
+  if (!state_.up) return kServiceDown;
+  return state_.live.apiVersion;
+}
+
+int32_t TimeService::getSelectedTrId(char* buffer, uint32_t capacity, koerr::Status* status) {
+  constexpr Call kCall = Call::kGetSelectedTrId;
+  if (status == nullptr) return kInvalidArgument;
+  if (buffer == nullptr || capacity == 0) {
+    return reportInvalidArgument(*status, kCall, "No buffer, or a capacity of 0.");
+  }
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (int32_t code = unavailable(state_, kCall, *status)) return code;
+  const Scenario& live = state_.live;
+  const Fault* fault = live.findFault(kCall);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
+  const bool selected = live.hasSelectedTr || (fault != nullptr && fault->replacesAnswer);
+  if (!selected) {
+    return fault != nullptr ? reportFault(*status, *fault, {}, {}) : 0;
+  }
+  const int32_t code =
+      serveText({&live.selectedTrId, 0}, fault, {}, {}, buffer, capacity, *status);
+  return code == 0 ? 1 : code;
+}
+
+int32_t TimeService::getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Status* status) {
+  constexpr Call kCall = Call::kGetSelectedTrOffsetNanos;
+  if (status == nullptr) return kInvalidArgument;
+  if (offsetOut == nullptr) return reportInvalidArgument(*status, kCall, "No output variable.");
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (int32_t code = unavailable(state_, kCall, *status)) return code;
+  const Fault* fault = state_.live.findFault(kCall);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
+  *offsetOut = state_.live.selectedTrOffsetNanos;
+  return fault != nullptr ? reportFault(*status, *fault, {}, {}) : 0;
+}
+
+int32_t TimeService::getPdmAttrJson(const char* key, char* buffer, uint32_t capacity,
+                                    koerr::Status* status) {
+  constexpr Call kCall = Call::kGetPdmAttrJson;
+  if (status == nullptr) return kInvalidArgument;
+  if (key == nullptr || buffer == nullptr || capacity == 0) {
+    return reportInvalidArgument(*status, kCall, "No key or buffer, or a capacity of 0.");
+  }
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (int32_t code = unavailable(state_, kCall, *status)) return code;
+  const Fault* fault = state_.live.findFault(kCall, {}, key);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, key);
+  Answer answer{nullptr, 0};
+  if (fault == nullptr || !fault->replacesAnswer) {
+    const auto found = state_.live.pdmAttrAnswers.find(std::string_view(key));
+    if (found != state_.live.pdmAttrAnswers.end()) {
+      answer.text = &found->second;
+    } else {
+      answer.code = reportNoAttr(*status, kCall, {}, key);
+    }
+  }
+  return serveText(answer, fault, {}, key, buffer, capacity, *status);
+}
+
+int32_t TimeService::getPdmMetadataJson(char* buffer, uint32_t capacity, koerr::Status* status) {
+  constexpr Call kCall = Call::kGetPdmMetadataJson;
+  if (status == nullptr) return kInvalidArgument;
+  if (buffer == nullptr || capacity == 0) {
+    return reportInvalidArgument(*status, kCall, "No buffer, or a capacity of 0.");
+  }
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (int32_t code = unavailable(state_, kCall, *status)) return code;
+  const Fault* fault = state_.live.findFault(kCall);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
+  return serveText({&state_.live.pdmMetadataAnswer, 0}, fault, {}, {}, buffer, capacity,
+                   *status);
+}
+
+int32_t TimeService::getTrAttrJson(const char* trId, const char* key, char* buffer,
+                                   uint32_t capacity, koerr::Status* status) {
+  constexpr Call kCall = Call::kGetTrAttrJson;
+  if (status == nullptr) return kInvalidArgument;
+  if (trId == nullptr || key == nullptr || buffer == nullptr || capacity == 0) {
+    return reportInvalidArgument(*status, kCall, "No TR, key or buffer, or a capacity of 0.");
+  }
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (int32_t code = unavailable(state_, kCall, *status)) return code;
+  const Fault* fault = state_.live.findFault(kCall, trId, key);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, key);
+  Answer answer{nullptr, 0};
+  if (fault == nullptr || !fault->replacesAnswer) {
+    const auto tr = state_.live.trs.find(std::string_view(trId));
+    if (tr == state_.live.trs.end()) {
+      answer.code = reportNoTr(*status, kCall, trId);
+    } else {
+      const auto found = tr->second.attrAnswers.find(std::string_view(key));
+      if (found != tr->second.attrAnswers.end()) {
+        answer.text = &found->second;
+      } else {
+        answer.code = reportNoAttr(*status, kCall, trId, key);
+      }
+    }
+  }
+  return serveText(answer, fault, trId, key, buffer, capacity, *status);
+}
+
+int32_t TimeService::getTrMetadataJson(const char* trId, char* buffer, uint32_t capacity,
+                                       koerr::Status* status) {
+  constexpr Call kCall = Call::kGetTrMetadataJson;
+  if (status == nullptr) return kInvalidArgument;
+  if (trId == nullptr || buffer == nullptr || capacity == 0) {
+    return reportInvalidArgument(*status, kCall, "No TR or buffer, or a capacity of 0.");
+  }
+  if (pollFile_) reloadIfFileChanged();
+  std::shared_lock<std::shared_mutex> lock(mutex_);
+  if (int32_t code = unavailable(state_, kCall, *status)) return code;
+  const Fault* fault = state_.live.findFault(kCall, trId);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, {});
+  Answer answer{nullptr, 0};
+  if (fault == nullptr || !fault->replacesAnswer) {
+    const auto tr = state_.live.trs.find(std::string_view(trId));
+    if (tr != state_.live.trs.end()) {
+      answer.text = &tr->second.metadataAnswer;
+    } else {
+      answer.code = reportNoTr(*status, kCall, trId);
+    }
+  }
+  return serveText(answer, fault, trId, {}, buffer, capacity, *status);
+}
+
+// The common frame of the state-changing calls: checks, the call's fault,
+// then `apply(state, status)` under the exclusive lock.
+template <typename Change>
+int32_t TimeService::change(Call call, std::string_view trId, koerr::Status* status,
+                            Change&& apply) {
+  if (pollFile_) reloadIfFileChanged();
+  std::unique_lock<std::shared_mutex> lock(mutex_);
+  if (!state_.usable) return unavailable(state_, call, *status);
+  const bool serviceCall = call == Call::kRestartService || call == Call::kBringDownService ||
+                           call == Call::kBringUpService;
+  if (!serviceCall) {
+    if (int32_t code = unavailable(state_, call, *status)) return code;
+  }
+  const Fault* fault = state_.live.findFault(call, trId);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, {});
+  if (int32_t code = apply(state_, *status)) return code;
+  return fault != nullptr ? reportFault(*status, *fault, trId, {}) : 0;
+}
+
+int32_t TimeService::setTrAttr(const char* trId, const char* key, const char* value,
+                               koerr::Status* status) {
+  constexpr Call kCall = Call::kSetTrAttr;
+  if (status == nullptr) return kInvalidArgument;
+  if (trId == nullptr || key == nullptr || value == nullptr) {
+    return reportInvalidArgument(*status, kCall, "No TR, key or value.");
+  }
+  // Rendered before taking the lock: parsing the value is the slow part.
+  std::string answer = renderMember(key, valueFromText(value));
+  return change(kCall, trId, status, [&](State& state, koerr::Status& st) {
+    const auto tr = state.live.trs.find(std::string_view(trId));
+    if (tr == state.live.trs.end()) return reportNoTr(st, kCall, trId);
+    tr->second.attrAnswers[key] = std::move(answer);
+    return 0;
+  });
+}
+
+int32_t TimeService::restartService(koerr::Status* status) {
+  if (status == nullptr) return kInvalidArgument;
+  return change(Call::kRestartService, {}, status, [](State& state, koerr::Status&) {
+    state.live.trs = state.saved;
+    state.up = true;
+    return 0;
+  });
+}
+
+int32_t TimeService::bringDownService(koerr::Status* status) {
+  if (status == nullptr) return kInvalidArgument;
+  return change(Call::kBringDownService, {}, status, [](State& state, koerr::Status&) {
+    state.up = false;
+    return 0;
+  });
+}
+
+int32_t TimeService::bringUpService(koerr::Status* status) {
+  if (status == nullptr) return kInvalidArgument;
+  return change(Call::kBringUpService, {}, status, [](State& state, koerr::Status&) {
+    state.up = true;
+    return 0;
+  });
+}
+
+int32_t TimeService::persistConfig(koerr::Status* status) {
+  if (status == nullptr) return kInvalidArgument;
+  return change(Call::kPersistConfig, {}, status, [](State& state, koerr::Status&) {
+    state.saved = state.live.trs;
+    return 0;
+  });
+}
+
+int32_t TimeService::updateTrFromConfig(const char* trId, koerr::Status* status) {
+  constexpr Call kCall = Call::kUpdateTrFromConfig;
+  if (status == nullptr) return kInvalidArgument;
+  if (trId == nullptr) return reportInvalidArgument(*status, kCall, "No TR.");
+  return change(kCall, trId, status, [&](State& state, koerr::Status& st) {
+    const auto live = state.live.trs.find(std::string_view(trId));
+    const auto saved = state.saved.find(std::string_view(trId));
+    if (live == state.live.trs.end() || saved == state.saved.end()) {
+      return reportNoTr(st, kCall, trId);
+    }
+    live->second = saved->second;
+    return 0;
+  });
+}
+
+int32_t TimeService::adjustTime(int64_t seconds, int64_t nanoseconds, koerr::Status* status) {
+  constexpr Call kCall = Call::kAdjustTime;
+  if (status == nullptr) return kInvalidArgument;
+  return change(kCall, {}, status, [&](State& state, koerr::Status& st) {
+    int64_t step;
+    int64_t offset;
+    if (__builtin_mul_overflow(seconds, int64_t{1000000000}, &step) ||
+        __builtin_add_overflow(step, nanoseconds, &step) ||
+        __builtin_add_overflow(state.live.selectedTrOffsetNanos, step, &offset)) {
+      return reportInvalidArgument(st, kCall, "The step overflows 64-bit nanoseconds.");
+    }
+    state.live.selectedTrOffsetNanos = offset;
+    return 0;
+  });
+}
+
+}  // namespace kopdmsim

@@ -1,0 +1,104 @@
+// The simulated time-sync manager: serves a scenario (a file, or the built-in
+// default) through the client library's calls and applies the state-changing
+// calls to it in memory. Answers are rendered when the scenario is read, so a
+// call costs a reader lock, a lookup and a copy; the file is watched by a
+// thread, so a call never looks at the file system.
+//
+// Thread-safety: every operation may run on several threads at once; readers
+// share a lock, the state-changing calls and reloads take it alone.
+#ifndef KOPDM_CLIENTAPI_TIME_SERVICE_H_
+#define KOPDM_CLIENTAPI_TIME_SERVICE_H_
+
+#include <sys/types.h>
+
+#include <cstdint>
+#include <ctime>
+#include <memory>
+#include <shared_mutex>
+#include <string>
+#include <string_view>
+
+#include "error_record/status.h"
+#include "scenario.h"
+#include "scenario_watch.h"
+
+namespace kopdmsim {
+
+class TimeService {
+ public:
+  // An empty `path` serves the built-in default scenario.
+  explicit TimeService(std::string path);
+  ~TimeService();
+  TimeService(const TimeService&) = delete;
+  TimeService& operator=(const TimeService&) = delete;
+
+  // The results follow the client library's header: 0 (1 for a selected TR)
+  // on success, otherwise the code reported in `status`.
+  int32_t getApiVersion();
+  int32_t getSelectedTrId(char* buffer, uint32_t capacity, koerr::Status* status);
+  int32_t getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Status* status);
+  int32_t getPdmAttrJson(const char* key, char* buffer, uint32_t capacity, koerr::Status* status);
+  int32_t getPdmMetadataJson(char* buffer, uint32_t capacity, koerr::Status* status);
+  int32_t getTrAttrJson(const char* trId, const char* key, char* buffer, uint32_t capacity,
+                        koerr::Status* status);
+  int32_t getTrMetadataJson(const char* trId, char* buffer, uint32_t capacity,
+                            koerr::Status* status);
+  int32_t setTrAttr(const char* trId, const char* key, const char* value, koerr::Status* status);
+  int32_t restartService(koerr::Status* status);
+  int32_t bringDownService(koerr::Status* status);
+  int32_t bringUpService(koerr::Status* status);
+  int32_t persistConfig(koerr::Status* status);
+  int32_t updateTrFromConfig(const char* trId, koerr::Status* status);
+  int32_t adjustTime(int64_t seconds, int64_t nanoseconds, koerr::Status* status);
+
+ private:
+  struct FileStamp {
+    bool exists = false;
+    dev_t device = 0;
+    ino_t inode = 0;
+    off_t size = 0;
+    timespec modified{};
+    bool operator==(const FileStamp& other) const;
+  };
+  struct State {
+    bool usable = false;
+    std::string problem;   // what is wrong with the scenario when not usable
+    Scenario live;         // what the calls answer
+    TimeReferences saved;  // the TRs as last persisted (or loaded)
+    bool up = true;
+    FileStamp stamp;
+  };
+  // What a text call answers: the text, or null after an error was reported.
+  struct Answer;
+
+  static FileStamp stampOf(const std::string& path);
+  State loadState() const;
+  void reload();
+  void reloadIfFileChanged();
+
+  // Reports the scenario problem or the service being down, if any.
+  int32_t unavailable(const State& state, Call call, koerr::Status& status) const;
+  int32_t serveText(const Answer& answer, const Fault* fault, std::string_view trId,
+                    std::string_view key, char* buffer, uint32_t capacity,
+                    koerr::Status& status) const;
+  template <typename Change>
+  int32_t change(Call call, std::string_view trId, koerr::Status* status, Change&& apply);
+
+  int32_t reportInvalidArgument(koerr::Status& status, Call call, const char* problem) const;
+  int32_t reportFault(koerr::Status& status, const Fault& fault, std::string_view trId,
+                      std::string_view key) const;
+  int32_t reportNoTr(koerr::Status& status, Call call, std::string_view trId) const;
+  int32_t reportNoAttr(koerr::Status& status, Call call, std::string_view trId,
+                       std::string_view key) const;
+  const char* sourceName() const;
+
+  const std::string path_;
+  mutable std::shared_mutex mutex_;
+  State state_;
+  std::unique_ptr<ScenarioWatch> watch_;  // null for the built-in scenario
+  bool pollFile_ = false;                  // the watch could not be set up
+};
+
+}  // namespace kopdmsim
+
+#endif  // KOPDM_CLIENTAPI_TIME_SERVICE_H_
