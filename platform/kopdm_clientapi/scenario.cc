@@ -164,7 +164,9 @@ bool readOptionalString(const cJSON* entry, const char* name, const std::string&
 Fault readFault(const cJSON* entry, std::size_t index) {
   const std::string where = "\"faults\"[" + std::to_string(index) + "]";
   requireObject(entry, where);
-  Fault fault{callFromName(optionalMember(entry, "call"), where), index};
+  Fault fault;
+  fault.call = callFromName(optionalMember(entry, "call"), where);
+  fault.index = index;
   fault.matchesTrId = readOptionalString(entry, "trId", where, &fault.trId);
   fault.matchesKey = readOptionalString(entry, "key", where, &fault.key);
   fault.replacesAnswer = readOptionalString(entry, "answer", where, &fault.answer);

@@ -34,8 +34,8 @@ struct TimeReference {
 using TimeReferences = std::map<std::string, TimeReference, std::less<>>;
 
 struct Fault {
-  Call call;
-  std::size_t index;  // position in the scenario's "faults", for the record
+  Call call = Call::kGetApiVersion;
+  std::size_t index = 0;  // position in the scenario's "faults", for the record
   bool matchesTrId = false;
   std::string trId;
   bool matchesKey = false;
