@@ -233,7 +233,7 @@ std::string syntaxProblem(const std::string& text, const char* end) {
       ++column;
     }
   }
-  return "not valid JSON (syntax error at line " + std::to_string(line) + ", column " +
+  return "the text is not valid JSON (syntax error at line " + std::to_string(line) + ", column " +
          std::to_string(column) + ")";
 }
 

@@ -22,7 +22,7 @@ constexpr long kMaxScenarioBytes = 16L * 1024 * 1024;
 bool readFile(const std::string& path, std::string* text, std::string* problem) {
   FILE* file = std::fopen(path.c_str(), "rb");
   if (file == nullptr) {
-    *problem = std::string("cannot be opened: ") + std::strerror(errno);
+    *problem = std::string("the file cannot be opened: ") + std::strerror(errno);
     return false;
   }
   char chunk[8192];
@@ -31,13 +31,13 @@ bool readFile(const std::string& path, std::string* text, std::string* problem) 
     text->append(chunk, count);
     if (static_cast<long>(text->size()) > kMaxScenarioBytes) {
       std::fclose(file);
-      *problem = "is larger than 16 MiB";
+      *problem = "the file is larger than 16 MiB";
       return false;
     }
   }
   const bool failed = std::ferror(file) != 0;
   std::fclose(file);
-  if (failed) *problem = "cannot be read";
+  if (failed) *problem = "the file cannot be read";
   return !failed;
 }
 
@@ -121,7 +121,7 @@ int32_t TimeService::unavailable(const State& state, Call call, koerr::Status& s
   if (!state.usable) {
     koerr::Report(status, kScenarioUnusable, "kopdmclientapi_scenarioUnusable", kFile, __LINE__)
         .open(kChannel)
-        .add("message", "The scenario file " + state.problem + ".")
+        .add("message", "Unusable scenario: " + state.problem + ".")
         .add("scenarioFile", sourceName())
         .add("call", callName(call))
         .close();

@@ -1,0 +1,292 @@
+// ApiWrapper and TimescaleHelpers against the real stand-in library, driven by
+// scenario files that each test writes.
+#include <cjson/cJSON.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <memory>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "error_record/error.h"
+#include "kopdm_clientapi.h"
+#include "kopdm_clientapi/api_wrapper.h"
+#include "kopdm_clientapi/scenario_file.h"
+#include "kosdtools_timescales/timescale_helpers.h"
+
+namespace {
+
+using timesvc_test::install;
+using Strings = std::vector<std::string>;
+
+constexpr int32_t kAttrNotSet = -1074100990;
+constexpr int32_t kServiceDown = -1074100992;
+constexpr int32_t kScenarioUnusable = -1074100993;
+
+std::string tr(const std::string& id, const std::string& type, const std::string& gm,
+               const std::string& port) {
+  return "\"" + id + "\":{\"attrs\":{\"type\":\"" + type + "\",\"gmClockId\":\"" + gm +
+         "\",\"portState\":\"" + port + "\"}}";
+}
+
+// Four TRs covering each way into (and out of) the published list.
+const std::string kFourTrs =
+    "\"selectedTrId\":\"slave 1\",\"selectedTrOffsetNanos\":-1500,\"trs\":{" +
+    tr("master0", "IEEE 1588-2008", "gm m", "PTP_MASTER") + "," +
+    tr("slave 1", "IEEE 802.1AS-2011", "gm s", "PTP_SLAVE") + "," +
+    tr("bc2", "IEEE 1588-2008 BC", "gm-b", "PTP_LISTENING") + "," +
+    tr("idle3", "IEEE 1588-2008", "gm i", "PTP_SLAVE") + "}";
+
+struct Record {
+  explicit Record(const char* text) : root(cJSON_Parse(text)) {}
+  ~Record() { cJSON_Delete(root); }
+  const cJSON* at(const char* key, const cJSON* in = nullptr) const {
+    return cJSON_GetObjectItemCaseSensitive(in != nullptr ? in : root, key);
+  }
+  std::string text(const char* key, const cJSON* in = nullptr) const {
+    const cJSON* item = at(key, in);
+    return cJSON_IsString(item) ? item->valuestring : "<missing " + std::string(key) + ">";
+  }
+  double number(const char* key, const cJSON* in = nullptr) const {
+    const cJSON* item = at(key, in);
+    return cJSON_IsNumber(item) ? item->valuedouble : -1;
+  }
+  cJSON* root;
+};
+
+// The message of the record every call fails with while the scenario is
+// unusable, checking the record's code and file name on the way.
+std::string unusableBecause(kopendulo::ApiWrapper& wrapper) {
+  try {
+    std::string answer;
+    wrapper.getTrMetadataJson("any", &answer);
+  } catch (const koerr::Exception& e) {
+    Record record(e.what());
+    const cJSON* debug = record.at("kopdmclientapi_debug");
+    if (e.code() == kScenarioUnusable &&
+        record.text("scenarioFile", debug) == timesvc_test::scenarioPath()) {
+      return record.text("message", debug);
+    }
+  }
+  return "<usable>";
+}
+
+class AgainstStandIn : public ::testing::Test {
+ protected:
+  std::shared_ptr<kopendulo::ApiWrapper> wrapper = std::make_shared<kopendulo::ApiWrapper>();
+  kosdtools::pendulo::TimescaleHelpers helpers{wrapper};
+};
+
+TEST_F(AgainstStandIn, PublishesUsableTimeReferencesInPriorityOrder) {
+  install(kFourTrs);
+  EXPECT_EQ(helpers.getTimescaleUris(),
+            (Strings{"/quillon/timescales/pendulo/bc2/gm-b",
+                     "/quillon/timescales/pendulo/slave-1/gm-s",
+                     "/quillon/timescales/pendulo/master0/gm-m"}));
+  EXPECT_EQ(helpers.getFirstTrTimescaleUri(), "/quillon/timescales/pendulo/master0/gm-m");
+  int64_t offset = 0;
+  EXPECT_EQ(wrapper->getSelectedTrOffsetNanos(&offset), 0);
+  EXPECT_EQ(offset, -1500);
+  EXPECT_EQ(wrapper->getApiVersion(), 1);
+  std::string metadata = "unchanged";
+  wrapper->getTrMetadataJson("bc2", &metadata);
+  EXPECT_EQ(metadata, "{}");
+}
+
+TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
+  const std::string longText(1023 - std::string("{\"t\":\"\"}").size(), 'x');
+  install(kFourTrs.substr(0, kFourTrs.size() - 1) +
+          ",\"long\":{\"metadata\":{\"t\":\"" + longText + "\"}}" +
+          ",\"longer\":{\"metadata\":{\"t\":\"" + longText + "y\"}}}," +
+          "\"faults\":["
+          "{\"call\":\"getTrAttrJson\",\"trId\":\"bc2\",\"key\":\"type\",\"answer\":\"not json\"},"
+          "{\"call\":\"getTrAttrJson\",\"key\":\"gmClockId\",\"code\":7},"
+          "{\"call\":\"getTrAttrJson\",\"trId\":\"idle3\",\"code\":-1074100990},"
+          "{\"call\":\"setTrAttr\",\"code\":-5}]");
+
+  try {
+    (void)helpers.getTrType("bc2");
+    FAIL() << "a malformed answer was accepted";
+  } catch (const koerr::Exception& e) {
+    EXPECT_STREQ(e.what(),
+                 "{\"error_constant\":\"koapalerr_invalidParameter\","
+                 "\"file\":\"kosdtools_timescales/timescaleHelpers\",\"line\":232,"
+                 "\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"Failed to parse "
+                 "typeKey key from trTypeJson.\",\"typeKey\":\"type\",\"trTypeJson\":\"not json\"}}");
+  }
+  // The warning on every grandmaster read is dropped: the URI still comes out.
+  EXPECT_EQ(helpers.getTimescaleUri("master0"), "/quillon/timescales/pendulo/master0/gm-m");
+
+  try {
+    (void)helpers.getTrType("idle3");
+    FAIL() << "an unset type was accepted";
+  } catch (const koerr::Exception& e) {
+    Record record(e.what());
+    EXPECT_EQ(e.code(), -52006);
+    EXPECT_EQ(record.number("line"), 214);
+    const cJSON* nested = cJSON_GetArrayItem(record.at("nested_error"), 0);
+    ASSERT_NE(nested, nullptr) << e.what();
+    EXPECT_EQ(record.text("error_constant", nested), "kopdmclientapi_injectedFault");
+    EXPECT_EQ(record.number("code", nested), kAttrNotSet);
+    const cJSON* debug = record.at("kopdmclientapi_debug", nested);
+    EXPECT_EQ(record.number("fault", debug), 2);
+    EXPECT_EQ(record.text("trId", debug), "idle3");
+  }
+
+  std::string metadata;
+  wrapper->getTrMetadataJson("long", &metadata);
+  EXPECT_EQ(metadata.size(), 1023u);
+  EXPECT_EQ(metadata, "{\"t\":\"" + longText + "\"}");
+  wrapper->getTrMetadataJson("longer", &metadata);
+  EXPECT_EQ(metadata, "{\"t\":\"" + longText + "y\"");  // cut to the buffer less its NUL
+
+  try {
+    wrapper->setTrAttr("bc2", "portState", "PTP_MASTER");
+    FAIL() << "the injected failure was lost";
+  } catch (const koerr::Exception& e) {
+    EXPECT_EQ(e.code(), -5);
+  }
+}
+
+TEST_F(AgainstStandIn, SelectedTrIdsUpTo255CharactersArriveWhole) {
+  for (const size_t length : {255u, 256u}) {
+    SCOPED_TRACE(length);
+    const std::string id(length, 's');
+    install("\"selectedTrId\":\"" + id + "\",\"trs\":{" +
+            tr(id, "IEEE 1588-2008", "gm", "PTP_SLAVE") + "}");
+    std::string selected;
+    ASSERT_TRUE(wrapper->getSelectedTrId(&selected));
+    EXPECT_EQ(selected, id.substr(0, 255));
+    // A cut identifier no longer names its TR, so nothing is published.
+    EXPECT_EQ(helpers.getTimescaleUris().size(), length == 255 ? 1u : 0u);
+  }
+  install("\"trs\":{}");
+  std::string selected = "unchanged";
+  EXPECT_FALSE(wrapper->getSelectedTrId(&selected));
+  EXPECT_EQ(selected, "unchanged");
+  EXPECT_TRUE(helpers.getTrIds().empty());
+}
+
+TEST_F(AgainstStandIn, StateChangingCallsActOnTheServedState) {
+  install(kFourTrs);
+  wrapper->setTrAttr("idle3", "portState", "PTP_DISABLED");
+  wrapper->setTrAttr("idle3", "domainNumber", "24");
+  std::string answer;
+  wrapper->getTrAttrJson("idle3", "domainNumber", &answer);
+  EXPECT_EQ(answer, "{\"domainNumber\":24}");
+  EXPECT_EQ(helpers.getTimescaleUris().back(), "/quillon/timescales/pendulo/idle3/gm-i");
+
+  wrapper->updateTrFromConfig("idle3");  // back to the loaded configuration
+  EXPECT_EQ(helpers.getTrPortState("idle3"), "PTP_SLAVE");
+
+  wrapper->setTrAttr("idle3", "portState", "PTP_MASTER");
+  wrapper->persistConfig();
+  wrapper->setTrAttr("idle3", "portState", "PTP_SLAVE");
+  wrapper->restartService();  // drops what was not persisted
+  EXPECT_EQ(helpers.getTrPortState("idle3"), "PTP_MASTER");
+
+  EXPECT_EQ(wrapper->adjustTime(2, -500), 0);
+  int64_t offset = 0;
+  wrapper->getSelectedTrOffsetNanos(&offset);
+  EXPECT_EQ(offset, 2 * 1000000000LL - 500 - 1500);
+
+  wrapper->bringDownService();
+  EXPECT_EQ(wrapper->getApiVersion(), kServiceDown);
+  try {
+    (void)helpers.getTimescaleUris();
+    FAIL() << "a service that is down answered";
+  } catch (const koerr::Exception& e) {
+    EXPECT_EQ(e.code(), kServiceDown);
+  }
+  wrapper->bringUpService();
+  EXPECT_EQ(helpers.getTimescaleUris().size(), 4u);
+}
+
+TEST_F(AgainstStandIn, RewrittenOrBrokenScenarioFilesAreServedOnTheNextCall) {
+  install(kFourTrs);
+  ASSERT_EQ(helpers.getTrIds().size(), 4u);
+  install("\"trs\":{" + tr("only", "IEEE 1588-2008 BC", "gm", "PTP_MASTER") + "}");
+  EXPECT_EQ(helpers.getTrIds(), Strings{"only"});
+
+  struct Broken {
+    const char* text;
+    const char* problem;
+  };
+  const Broken cases[] = {
+      {"{\"trs\":{},\n  \"faults\": [}",
+       "the text is not valid JSON (syntax error at line 2, column 14)"},
+      {"{\"trs\":[]}", "\"trs\" must be an object"},
+      {"{\"trs\":{},\"selectedTr\":\"a\"}", "unknown member \"selectedTr\""},
+      {"{\"trs\":{},\"faults\":[{\"call\":\"getTrAttrJson\"}]}",
+       "\"faults\"[0] needs \"code\" or \"answer\""},
+  };
+  for (const Broken& broken : cases) {
+    SCOPED_TRACE(broken.text);
+    const std::string message = std::string("Unusable scenario: ") + broken.problem + ".";
+    timesvc_test::installRaw(broken.text, [&] { return unusableBecause(*wrapper) == message; });
+    std::string answer = "unchanged";
+    EXPECT_THROW(wrapper->getPdmAttrJson("timeReferences", &answer), koerr::Exception);
+    EXPECT_EQ(answer, "unchanged");
+  }
+  timesvc_test::removeScenario([&] {
+    return unusableBecause(*wrapper) ==
+           "Unusable scenario: the file cannot be opened: No such file or directory.";
+  });
+  install(kFourTrs);
+  EXPECT_EQ(helpers.getTimescaleUris().size(), 3u);
+}
+
+TEST_F(AgainstStandIn, ConcurrentReadersSeeWholeStatesWhileOthersChangeThem) {
+  install(kFourTrs);
+  std::vector<std::thread> readers;
+  for (int t = 0; t < 3; ++t) {
+    readers.emplace_back([&] {
+      for (int i = 0; i < 200; ++i) {
+        const Strings uris = helpers.getTimescaleUris();
+        // idle3 flips between master (published at the back) and slave (not).
+        ASSERT_TRUE(uris.size() == 3 || uris.size() == 4);
+      }
+    });
+  }
+  for (int i = 0; i < 200; ++i) {
+    wrapper->setTrAttr("idle3", "portState", i % 2 ? "PTP_MASTER" : "PTP_SLAVE");
+  }
+  for (std::thread& reader : readers) reader.join();
+}
+
+TEST(ApiWrapper, MissingOutParametersAreRefusedBeforeTheLibraryIsCalled) {
+  kopendulo::ApiWrapper wrapper;
+  struct Case {
+    const char* name;
+    int line;
+    std::function<void()> call;
+  };
+  const std::string tr = "tr0";
+  const Case cases[] = {
+      {"selectedTrIdOut", 29, [&] { wrapper.getSelectedTrId(nullptr); }},
+      {"selectedTrOffsetNanosOut", 48, [&] { wrapper.getSelectedTrOffsetNanos(nullptr); }},
+      {"pdmAttrJsonOut", 58, [&] { wrapper.getPdmAttrJson("timeReferences", nullptr); }},
+      {"pdmMetadataJsonOut", 75, [&] { wrapper.getPdmMetadataJson(nullptr); }},
+      {"trAttrJsonOut", 97, [&] { wrapper.getTrAttrJson(tr, "type", nullptr); }},
+      {"trMetadataJsonOut", 116, [&] { wrapper.getTrMetadataJson(tr, nullptr); }},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.name);
+    try {
+      c.call();
+      FAIL() << "no error";
+    } catch (const koerr::Exception& e) {
+      EXPECT_EQ(e.code(), -52005);
+      EXPECT_EQ(std::string(e.what()),
+                "{\"error_constant\":\"koapalerr_invalidParameter\","
+                "\"file\":\"kopdm_clientapi/apiWrapper\",\"line\":" +
+                    std::to_string(c.line) +
+                    ",\"component\":\"quillon\",\"kopendulo_debug\":{\"message\":\"Encountered "
+                    "missing parameter needed for task completion.\",\"" +
+                    c.name + "\":\"nullptr\"}}");
+    }
+  }
+}
+
+}  // namespace
