@@ -6,7 +6,7 @@ set -euo pipefail
 packages=(
   cmake ninja-build g++ pkg-config make locales
   libgtest-dev libgmock-dev libbenchmark-dev
-  libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev
+  libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
 )
 # Extra sets for the optional tools: 'fuzz' and 'perf' (see README).
 for extra in "$@"; do
