@@ -1,0 +1,75 @@
+// The HTTP/1.1 front of the host: a libmicrohttpd daemon (epoll, internal
+// thread pool, keep-alive) that routes each request for the mounted service
+// to the plug-in's Run entry point and sends back what it wrote.
+//
+// Thread-safety: start() and stop() from one controlling thread; requests are
+// answered on the pool's threads.
+#ifndef WS_RUNTIME_HOST_HTTP_SERVER_H_
+#define WS_RUNTIME_HOST_HTTP_SERVER_H_
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstdint>
+#include <mutex>
+#include <string>
+
+#include <microhttpd.h>
+
+#include "access_log.h"
+#include "options.h"
+#include "plugin.h"
+#include "ws_runtime/exchange.h"
+
+namespace ws::host {
+
+class HttpServer {
+ public:
+  HttpServer(const Options& options, const Plugin& plugin, const AccessLog& log)
+      : options_(options), plugin_(plugin), log_(log) {}
+  ~HttpServer();
+  HttpServer(const HttpServer&) = delete;
+  HttpServer& operator=(const HttpServer&) = delete;
+
+  // Binds and starts serving. False with `error` set when the address cannot
+  // be used.
+  [[nodiscard]] bool start(std::string& error);
+  // The bound port (useful with port 0).
+  uint16_t port() const;
+  // Stops accepting, lets the requests in progress finish (answering any new
+  // request on an open connection with 503) for at most `grace`, then closes
+  // every connection and joins the threads. No Run is active afterwards.
+  void stop(std::chrono::milliseconds grace);
+
+  class Connection;  // per-connection state, reused across keep-alive requests
+
+ private:
+  MHD_Result answer(MHD_Connection* connection, const char* url, const char* method,
+                    const char* uploadData, size_t* uploadSize, void** requestContext);
+  MHD_Result respond(MHD_Connection* connection, Connection& state, const char* url,
+                     const char* method);
+  MHD_Result runPlugin(MHD_Connection* connection, Connection& state, const char* method,
+                       ws::runtime::Exchange& exchange);
+  void requestDone(Connection& state);
+
+  static MHD_Result onRequest(void* self, MHD_Connection* connection, const char* url,
+                              const char* method, const char* version, const char* uploadData,
+                              size_t* uploadSize, void** requestContext);
+  static void onRequestDone(void* self, MHD_Connection* connection, void** requestContext,
+                            MHD_RequestTerminationCode reason);
+  static void onConnection(void* self, MHD_Connection* connection, void** socketContext,
+                           MHD_ConnectionNotificationCode event);
+
+  const Options& options_;
+  const Plugin& plugin_;
+  const AccessLog& log_;
+  MHD_Daemon* daemon_ = nullptr;
+  std::atomic<bool> stopping_{false};
+  std::atomic<int> inFlight_{0};
+  std::mutex drainLock_;
+  std::condition_variable drained_;
+};
+
+}  // namespace ws::host
+
+#endif  // WS_RUNTIME_HOST_HTTP_SERVER_H_

@@ -1,0 +1,129 @@
+#include "url_mapping.h"
+
+namespace ws::host {
+
+namespace {
+
+constexpr size_t kCommandOnly = 2;      // service, command
+constexpr size_t kWithResource = 5;     // service, command, plugin, type, name
+constexpr const char32_t* kResourceVariables[] = {U"plugin", U"type", U"name"};
+
+int hexValue(char c) {
+  if (c >= '0' && c <= '9') return c - '0';
+  if (c >= 'a' && c <= 'f') return c - 'a' + 10;
+  if (c >= 'A' && c <= 'F') return c - 'A' + 10;
+  return -1;
+}
+
+std::vector<std::string_view> splitPath(std::string_view path) {
+  std::vector<std::string_view> segments;
+  size_t start = 1;  // after the leading '/'
+  while (true) {
+    const size_t slash = path.find('/', start);
+    if (slash == std::string_view::npos) {
+      segments.push_back(path.substr(start));
+      return segments;
+    }
+    segments.push_back(path.substr(start, slash - start));
+    start = slash + 1;
+  }
+}
+
+bool decodeComponent(std::string_view raw, std::string& scratch, std::u32string& out) {
+  return percentDecode(raw, scratch) && utf8Decode(scratch, out);
+}
+
+}  // namespace
+
+bool percentDecode(std::string_view text, std::string& out) {
+  out.clear();
+  out.reserve(text.size());
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (text[i] != '%') {
+      out.push_back(text[i]);
+      continue;
+    }
+    if (i + 2 >= text.size()) return false;
+    const int high = hexValue(text[i + 1]);
+    const int low = hexValue(text[i + 2]);
+    if (high < 0 || low < 0) return false;
+    out.push_back(static_cast<char>(high * 16 + low));
+    i += 2;
+  }
+  return true;
+}
+
+bool utf8Decode(std::string_view text, std::u32string& out) {
+  out.clear();
+  out.reserve(text.size());
+  size_t i = 0;
+  while (i < text.size()) {
+    const auto lead = static_cast<unsigned char>(text[i]);
+    if (lead < 0x80) {
+      out.push_back(lead);
+      ++i;
+      continue;
+    }
+    size_t extra;
+    char32_t value;
+    char32_t minimum;
+    if ((lead & 0xE0) == 0xC0) {
+      extra = 1, value = lead & 0x1F, minimum = 0x80;
+    } else if ((lead & 0xF0) == 0xE0) {
+      extra = 2, value = lead & 0x0F, minimum = 0x800;
+    } else if ((lead & 0xF8) == 0xF0) {
+      extra = 3, value = lead & 0x07, minimum = 0x10000;
+    } else {
+      return false;
+    }
+    if (text.size() - i <= extra) return false;
+    for (size_t k = 1; k <= extra; ++k) {
+      const auto next = static_cast<unsigned char>(text[i + k]);
+      if ((next & 0xC0) != 0x80) return false;
+      value = (value << 6) | (next & 0x3F);
+    }
+    if (value < minimum || value > 0x10FFFF || (value >= 0xD800 && value <= 0xDFFF)) return false;
+    out.push_back(value);
+    i += extra + 1;
+  }
+  return true;
+}
+
+Mapping mapUrl(std::string_view service, std::string_view rawPath,
+               const std::vector<RawParameter>& query, ws::runtime::ExchangeRequest& request) {
+  if (rawPath.empty() || rawPath.front() != '/') return Mapping::kNotFound;
+  const std::vector<std::string_view> raw = splitPath(rawPath);
+  std::string scratch;
+  if (!percentDecode(raw[0], scratch) || scratch != service) return Mapping::kNotFound;
+  if (raw.size() != kCommandOnly && raw.size() != kWithResource) return Mapping::kNotFound;
+
+  std::vector<std::u32string> segments(raw.size());
+  for (size_t i = 1; i < raw.size(); ++i) {
+    if (raw[i].empty()) return Mapping::kNotFound;
+    if (!decodeComponent(raw[i], scratch, segments[i])) return Mapping::kBadRequest;
+  }
+  std::vector<std::pair<std::u32string, std::u32string>> parameters;
+  parameters.reserve(query.size());
+  for (const RawParameter& parameter : query) {
+    std::u32string key, value;
+    if (!decodeComponent(parameter.key, scratch, key) ||
+        !decodeComponent(parameter.value, scratch, value)) {
+      return Mapping::kBadRequest;
+    }
+    parameters.emplace_back(std::move(key), std::move(value));
+  }
+
+  // Each segment is valid on its own, so the whole path decodes too.
+  std::u32string path;
+  decodeComponent(rawPath, scratch, path);
+  request.path = std::move(path);
+  request.command = std::move(segments[1]);
+  request.variables.clear();
+  for (size_t i = 2; i < segments.size(); ++i) {
+    request.addVariable(kResourceVariables[i - 2], std::move(segments[i]));
+  }
+  for (auto& [key, value] : parameters) request.addVariable(std::move(key), std::move(value));
+  return Mapping::kMapped;
+}
+
+}  // namespace ws::host

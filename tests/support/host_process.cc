@@ -1,0 +1,189 @@
+#include "support/host_process.h"
+
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <map>
+#include <sstream>
+#include <stdexcept>
+#include <thread>
+
+extern char** environ;
+
+namespace quillon::test_support {
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+constexpr auto kPollInterval = std::chrono::milliseconds(5);
+constexpr auto kStartTimeout = std::chrono::seconds(30);
+constexpr const char* kListeningMarker = "listening on ";
+
+std::string readFile(const std::string& path) {
+  std::ifstream in(path, std::ios::binary);
+  std::ostringstream text;
+  text << in.rdbuf();
+  return text.str();
+}
+
+std::string makeLogFile() {
+  const char* dir = std::getenv("TMPDIR");
+  std::string path = std::string(dir != nullptr && *dir != '\0' ? dir : "/tmp") +
+                     "/ws-runtime-test-XXXXXX";
+  const int fd = ::mkstemp(path.data());
+  if (fd < 0) throw std::runtime_error("mkstemp: " + std::string(std::strerror(errno)));
+  ::close(fd);
+  return path;
+}
+
+int decodeWaitStatus(int status) {
+  if (WIFEXITED(status)) return WEXITSTATUS(status);
+  if (WIFSIGNALED(status)) return 128 + WTERMSIG(status);
+  return -1;
+}
+
+// Starts `args` with stdout and stderr appended to `logPath`.
+pid_t spawn(const std::vector<std::string>& args, const Environment& env,
+            const std::string& logPath) {
+  std::map<std::string, std::string> merged;
+  for (char** entry = environ; *entry != nullptr; ++entry) {
+    const std::string text = *entry;
+    const auto equals = text.find('=');
+    if (equals != std::string::npos) merged[text.substr(0, equals)] = text.substr(equals + 1);
+  }
+  for (const auto& [name, value] : env) merged[name] = value;
+  std::vector<std::string> envText;
+  for (const auto& [name, value] : merged) envText.push_back(name + "=" + value);
+
+  std::vector<char*> argv;
+  for (const std::string& arg : args) argv.push_back(const_cast<char*>(arg.c_str()));
+  argv.push_back(nullptr);
+  std::vector<char*> envp;
+  for (std::string& entry : envText) envp.push_back(entry.data());
+  envp.push_back(nullptr);
+
+  posix_spawn_file_actions_t actions;
+  posix_spawn_file_actions_init(&actions);
+  posix_spawn_file_actions_addopen(&actions, STDERR_FILENO, logPath.c_str(),
+                                   O_WRONLY | O_APPEND | O_CREAT, 0600);
+  posix_spawn_file_actions_adddup2(&actions, STDERR_FILENO, STDOUT_FILENO);
+  posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
+  // The child must not inherit blocked stop signals from a test thread.
+  posix_spawnattr_t attributes;
+  posix_spawnattr_init(&attributes);
+  sigset_t none;
+  sigemptyset(&none);
+  posix_spawnattr_setsigmask(&attributes, &none);
+  posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGMASK);
+  pid_t pid = -1;
+  const int error = posix_spawn(&pid, argv[0], &actions, &attributes, argv.data(), envp.data());
+  posix_spawn_file_actions_destroy(&actions);
+  posix_spawnattr_destroy(&attributes);
+  if (error != 0) {
+    throw std::runtime_error("posix_spawn " + args[0] + ": " + std::strerror(error));
+  }
+  return pid;
+}
+
+// The port announced in the log, or 0 while there is none.
+uint16_t announcedPort(const std::string& log) {
+  const auto marker = log.find(kListeningMarker);
+  if (marker == std::string::npos) return 0;
+  const auto space = log.find(' ', marker + std::strlen(kListeningMarker));
+  const auto colon = log.rfind(':', space);
+  if (space == std::string::npos || colon == std::string::npos || colon < marker) return 0;
+  return static_cast<uint16_t>(std::stoi(log.substr(colon + 1, space - colon - 1)));
+}
+
+}  // namespace
+
+HostProcess::HostProcess(const std::vector<std::string>& args, const Environment& env)
+    : logPath_(makeLogFile()) {
+  std::vector<std::string> argv = {kWsRuntimePath, "--listen", "127.0.0.1:0"};
+  argv.insert(argv.end(), args.begin(), args.end());
+  pid_ = spawn(argv, env, logPath_);
+  const auto deadline = Clock::now() + kStartTimeout;
+  while (port_ == 0) {
+    int status = 0;
+    if (::waitpid(pid_, &status, WNOHANG) == pid_) {
+      exitCode_ = decodeWaitStatus(status);
+      pid_ = -1;
+      const std::string text = log();
+      ::unlink(logPath_.c_str());
+      throw std::runtime_error("ws-runtime exited with " + std::to_string(exitCode_) +
+                               " before serving:\n" + text);
+    }
+    port_ = announcedPort(log());
+    if (port_ == 0 && Clock::now() > deadline) {
+      const std::string text = log();
+      stop(SIGKILL);
+      ::unlink(logPath_.c_str());
+      throw std::runtime_error("ws-runtime did not come up within 30 s:\n" + text);
+    }
+    if (port_ == 0) std::this_thread::sleep_for(kPollInterval);
+  }
+}
+
+HostProcess::~HostProcess() {
+  if (pid_ > 0) stop(SIGKILL);
+  ::unlink(logPath_.c_str());
+}
+
+void HostProcess::signal(int signal) {
+  if (pid_ > 0) ::kill(pid_, signal);
+}
+
+int HostProcess::wait() {
+  if (pid_ <= 0) return exitCode_;
+  int status = 0;
+  while (::waitpid(pid_, &status, 0) < 0 && errno == EINTR) {
+  }
+  exitCode_ = decodeWaitStatus(status);
+  pid_ = -1;
+  return exitCode_;
+}
+
+int HostProcess::stop(int signal) {
+  this->signal(signal);
+  return wait();
+}
+
+std::string HostProcess::log() const { return readFile(logPath_); }
+
+bool HostProcess::waitForLog(const std::string& text, std::chrono::milliseconds timeout) const {
+  const auto deadline = Clock::now() + timeout;
+  while (log().find(text) == std::string::npos) {
+    if (Clock::now() > deadline) return false;
+    std::this_thread::sleep_for(kPollInterval);
+  }
+  return true;
+}
+
+HostRun runHostToExit(const std::vector<std::string>& args, const Environment& env,
+                      std::chrono::milliseconds timeout) {
+  const std::string logPath = makeLogFile();
+  std::vector<std::string> argv = {kWsRuntimePath};
+  argv.insert(argv.end(), args.begin(), args.end());
+  const pid_t pid = spawn(argv, env, logPath);
+  const auto deadline = Clock::now() + timeout;
+  int status = 0;
+  while (::waitpid(pid, &status, WNOHANG) != pid) {
+    if (Clock::now() > deadline) {
+      ::kill(pid, SIGKILL);
+      ::waitpid(pid, &status, 0);
+      break;
+    }
+    std::this_thread::sleep_for(kPollInterval);
+  }
+  HostRun run{decodeWaitStatus(status), readFile(logPath)};
+  ::unlink(logPath.c_str());
+  return run;
+}
+
+}  // namespace quillon::test_support
