@@ -1,0 +1,99 @@
+#include <cjson/cJSON.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <string>
+#include <vector>
+
+#include "error_record/error.h"
+#include "kojsonlh/array_iterator.h"
+#include "kojsonlh/cjson_utils.h"
+#include "kojsonlh/cpp_json.h"
+#include "kosynctools_cjson/json_helper_functions.h"
+
+namespace {
+
+std::string thrownBy(const std::function<void()>& call) {
+  try {
+    call();
+  } catch (const koerr::Exception& e) {
+    return std::to_string(e.code()) + " " + e.what();
+  }
+  return "<nothing thrown>";
+}
+
+std::string headOnly(int code, const char* constant, const char* file, int line) {
+  return std::to_string(code) + " {\"error_constant\":\"" + constant + "\",\"file\":\"" + file +
+         "\",\"line\":" + std::to_string(line) + ",\"component\":\"quillon\"}";
+}
+
+TEST(JsonLayer, TypeTestsCompareTheWholeTypeWord) {
+  CppJson document("{\"s\":\"text\",\"a\":[1],\"n\":null,\"o\":{}}");
+  const cJSON* s = cJSONUtils::getObjectItem(document.get(), "S");  // keys match in any case
+  const cJSON* a = cJSONUtils::getObjectItem(document.get(), "a");
+  const cJSON* n = cJSONUtils::getObjectItem(document.get(), "n");
+  EXPECT_TRUE(cJSONUtils::isString(s) && cJSONUtils::isArray(a) && cJSONUtils::isNull(n));
+  EXPECT_FALSE(cJSONUtils::isString(a) || cJSONUtils::isArray(n) || cJSONUtils::isNull(s));
+  EXPECT_FALSE(cJSONUtils::isString(nullptr) || cJSONUtils::isArray(nullptr) ||
+               cJSONUtils::isNull(nullptr));
+  EXPECT_EQ(cJSONUtils::getString(s), "text");
+
+  // A reference to a string is no string here, though cJSON's own test says so.
+  CppJson reference(cJSON_CreateStringReference("borrowed"));
+  ASSERT_TRUE(cJSON_IsString(reference.get()));
+  EXPECT_FALSE(cJSONUtils::isString(reference.get()));
+  EXPECT_EQ(thrownBy([&] { (void)cJSONUtils::getString(reference.get()); }),
+            headOnly(-52004, "jsonErrorsTypeMismatch", "kojsonlh/cJSONUtils", 305));
+  EXPECT_EQ(thrownBy([&] { cJSONUtils::requireArray(s); }),
+            headOnly(-52004, "jsonErrorsNotAnArray", "kojsonlh/cJSONUtils", 83));
+  EXPECT_EQ(thrownBy([] { CppJson bad("{\"a\":"); }),
+            headOnly(-52005, "jsonErrorsInvalidJSON", "kojsonlh/CppJson", 34));
+}
+
+TEST(JsonLayer, ArraysAreWalkedInOrderAndNotPastTheEnd) {
+  CppJson document("[\"a\",\"b\",\"c\"]");
+  ArrayIterator elements(document.get());
+  std::vector<std::string> seen;
+  while (elements.hasNext()) seen.push_back(cJSONUtils::getString(elements.next()));
+  EXPECT_EQ(seen, (std::vector<std::string>{"a", "b", "c"}));
+  EXPECT_EQ(cJSONUtils::getString(elements.at(2)), "c");
+  const std::string outOfBounds =
+      headOnly(-52004, "jsonErrorsArrayItemOutOfBounds", "kojsonlh/ArrayIterator", 47);
+  EXPECT_EQ(thrownBy([&] { (void)elements.at(3); }), outOfBounds);
+  EXPECT_EQ(thrownBy([&] { (void)elements.next(); }), outOfBounds);
+
+  CppJson empty("[]");
+  EXPECT_EQ(thrownBy([&] { (void)ArrayIterator(empty.get()).at(0); }), outOfBounds);
+  CppJson object("{}");
+  EXPECT_EQ(thrownBy([&] { ArrayIterator notAnArray(object.get()); }),
+            headOnly(-52004, "jsonErrorsNotAnArray", "kojsonlh/cJSONUtils", 83));
+}
+
+TEST(JsonLayer, HolderOwnsExactlyOneTreeAtATime) {
+  CppJson holder("[1]");
+  holder.reset(cJSON_Parse("[2]"));  // the first tree is freed (the leak check sees it)
+  CppJson moved(std::move(holder));
+  EXPECT_EQ(holder.get(), nullptr);
+  EXPECT_EQ(cJSON_GetArrayItem(moved.get(), 0)->valuedouble, 2);
+  moved = CppJson("[3]");
+  EXPECT_EQ(cJSON_GetArrayItem(moved.get(), 0)->valuedouble, 3);
+  moved.reset();
+  EXPECT_EQ(moved.get(), nullptr);
+}
+
+TEST(JsonLayer, TypeMismatchesAreReportedWithTheAnswerAndKey) {
+  const std::string answer = "{\"gm\":[\"x\"]}";
+  CppJson document(answer);
+  const cJSON* gm = cJSONUtils::getObjectItem(document.get(), "gm");
+  EXPECT_EQ(thrownBy([&] { (void)kosynctools::cjson::getStringValue(gm, answer, "gm"); }),
+            "-52004 {\"error_constant\":\"errCode\",\"file\":\"kosynctools_cjson/"
+            "jsonHelperFunctions\",\"line\":50,\"component\":\"quillon\",\"kosync_debug\":"
+            "{\"message\":\"Error parsing: expected data type does not match the parsed value.\","
+            "\"JSON\":\"{\\\"gm\\\":[\\\"x\\\"]}\",\"key\":\"gm\"}}");
+  CppJson text("{\"gm\":\"x\"}");
+  EXPECT_EQ(kosynctools::cjson::getStringValue(
+                cJSONUtils::getObjectItem(text.get(), "gm"), "unused", "gm"),
+            "x");
+}
+
+}  // namespace

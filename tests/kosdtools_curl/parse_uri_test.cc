@@ -1,0 +1,92 @@
+#include <gtest/gtest.h>
+
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include "error_record/error.h"
+#include "kosdtools_curl/web_helper_functions.h"
+
+namespace {
+
+using Map = std::unordered_map<std::string, std::string>;
+using Keys = std::vector<std::string>;
+
+std::string uriError(int line, const char* message, const std::string& uri, int keyCount) {
+  std::string record =
+      "{\"error_constant\":\"koapalerr_invalidParameter\",\"file\":\"kosdtools_curl/"
+      "webHelperFunctions\",\"line\":" + std::to_string(line) +
+      ",\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"" + message +
+      "\",\"uri\":\"" + uri + "\"";
+  if (keyCount >= 0) record += ",\"uriKeys.size()\":" + std::to_string(keyCount);
+  return record + "}}";
+}
+
+TEST(ParseUri, BindsSegmentsToKeysInOrder) {
+  const Keys six = {"remoteHost", "webService", "resource", "plugin", "trId", "gmId"};
+  const Map expected = {{"remoteHost", "host"}, {"webService", "quillon"},
+                        {"resource", "timescales"}, {"plugin", "pendulo"},
+                        {"trId", "tr0"}, {"gmId", "gm0"}};
+  struct Case {
+    const char* uri;
+    Keys keys;
+    Map expected;
+  };
+  const Case cases[] = {
+      {"/host/quillon/timescales/pendulo/tr0/gm0", six, expected},
+      {"/host/quillon/timescales/pendulo/tr0/gm0/", six, expected},
+      {"a/b", {"x", "y"}, {{"x", "a"}, {"y", "b"}}},
+      {"/a/b", {"x", "y"}, {{"x", "a"}, {"y", "b"}}},
+      {"a/b/", {"x", "y"}, {{"x", "a"}, {"y", "b"}}},
+      {"/%20 A/b", {"x", "y"}, {{"x", "%20 A"}, {"y", "b"}}},  // raw, untrimmed
+      {"x", {"a", "a"}, {{"a", "x"}}},  // the last key is recognised by its name
+      {"p/q", {"k", "k"}, {{"k", "p"}}},  // the first of two equal keys stays
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.uri);
+    Map out;
+    kosdtools::curl::parseUri(c.uri, c.keys, out);
+    EXPECT_EQ(out, c.expected);
+  }
+  Map preset = {{"x", "kept"}};
+  kosdtools::curl::parseUri("a/b", {"x", "y"}, preset);
+  EXPECT_EQ(preset, (Map{{"x", "kept"}, {"y", "b"}}));
+}
+
+TEST(ParseUri, RefusesUrisThatDoNotPairWithTheKeys) {
+  const char* empty = "Failed to parse URI; URI is empty or was not provided URI keys.";
+  const char* contiguous = "Failed to parse URI; encountered contiguous delimiters.";
+  const char* moreKeys = "Failed to parse URI; more keys than URI parts.";
+  const char* moreParts = "Failed to parse URI; more URI parts than keys.";
+  struct Case {
+    const char* uri;
+    Keys keys;
+    std::string expected;
+  };
+  const Case cases[] = {
+      {"", {"x"}, uriError(176, empty, "", 1)},
+      {"a/b", {}, uriError(176, empty, "a/b", 0)},
+      {"/", {"x"}, uriError(194, contiguous, "/", -1)},
+      {"//a", {"x"}, uriError(194, contiguous, "//a", -1)},
+      {"a//b", {"x", "y", "z"}, uriError(194, contiguous, "a//b", -1)},
+      {"a/b/", {"x", "y", "z"}, uriError(194, contiguous, "a/b/", -1)},
+      {"a/b", {"x", "y", "z"}, uriError(207, moreKeys, "a/b", 3)},
+      {"a/b/c", {"x", "y"}, uriError(223, moreParts, "a/b/c", 2)},
+      {"a/b//", {"x", "y"}, uriError(223, moreParts, "a/b//", 2)},
+      {"a/b/c/", {"x", "y"}, uriError(223, moreParts, "a/b/c/", 2)},
+      {"a\"\\", {"x", "y"}, uriError(207, moreKeys, "a\\\"\\\\", 2)},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.uri);
+    Map out;
+    try {
+      kosdtools::curl::parseUri(c.uri, c.keys, out);
+      ADD_FAILURE() << "accepted";
+    } catch (const koerr::Exception& e) {
+      EXPECT_EQ(e.code(), -52005);
+      EXPECT_EQ(e.what(), c.expected);
+    }
+  }
+}
+
+}  // namespace

@@ -1,0 +1,317 @@
+#include "kosdtools_timescales/timescale_helpers.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "error_record/error.h"
+
+namespace {
+
+using ::testing::_;
+using ::testing::Invoke;
+using ::testing::NiceMock;
+using Strings = std::vector<std::string>;
+
+class MockClient : public kopendulo::ApiWrapperInterface {
+ public:
+  MOCK_METHOD(int32_t, getApiVersion, (), (override));
+  MOCK_METHOD(bool, getSelectedTrId, (std::string*), (override));
+  MOCK_METHOD(int32_t, getSelectedTrOffsetNanos, (int64_t*), (override));
+  MOCK_METHOD(void, getPdmAttrJson, (const std::string&, std::string*), (override));
+  MOCK_METHOD(void, getPdmMetadataJson, (std::string*), (override));
+  MOCK_METHOD(void, getTrAttrJson, (const std::string&, const std::string&, std::string*),
+              (override));
+  MOCK_METHOD(void, getTrMetadataJson, (const std::string&, std::string*), (override));
+  MOCK_METHOD(void, setTrAttr, (const std::string&, const std::string&, const std::string&),
+              (override));
+  MOCK_METHOD(void, restartService, (), (override));
+  MOCK_METHOD(void, bringDownService, (), (override));
+  MOCK_METHOD(void, bringUpService, (), (override));
+  MOCK_METHOD(void, persistConfig, (), (override));
+  MOCK_METHOD(void, updateTrFromConfig, (const std::string&), (override));
+  MOCK_METHOD(int32_t, adjustTime, (int64_t, int64_t), (override));
+};
+
+// A time service made of answer texts; a missing TR attribute answer throws
+// the service's not-set error, as the real library does.
+struct Service {
+  std::string trList;
+  std::map<std::pair<std::string, std::string>, std::string> trAttrs;
+  std::string selected;  // empty: none selected
+  std::shared_ptr<NiceMock<MockClient>> client = std::make_shared<NiceMock<MockClient>>();
+
+  Service() {
+    ON_CALL(*client, getPdmAttrJson("timeReferences", _))
+        .WillByDefault(Invoke([this](const std::string&, std::string* out) { *out = trList; }));
+    ON_CALL(*client, getTrAttrJson(_, _, _))
+        .WillByDefault(Invoke([this](const std::string& tr, const std::string& key, std::string* out) {
+          const auto found = trAttrs.find({tr, key});
+          if (found == trAttrs.end()) raiseServiceError(-1074100990);
+          *out = found->second;
+        }));
+    ON_CALL(*client, getSelectedTrId(_)).WillByDefault(Invoke([this](std::string* out) {
+      if (selected.empty()) return false;
+      *out = selected;
+      return true;
+    }));
+  }
+  void add(const std::string& tr, const std::string& type, const std::string& gm,
+           const std::string& port) {
+    trAttrs[{tr, "type"}] = "{\"type\":\"" + type + "\"}";
+    trAttrs[{tr, "gmClockId"}] = "{\"gmClockId\":\"" + gm + "\"}";
+    trAttrs[{tr, "portState"}] = "{\"portState\":\"" + port + "\"}";
+  }
+  [[noreturn]] static void raiseServiceError(int32_t code) {
+    koerr::Error(code, "pdmErr", "pdm/lib", 3, "pdm_debug").add("m", "x").raise();
+  }
+};
+
+// The record helpers raise: fixed head, then the channel's lines.
+std::string helperRecord(const char* constant, int line, const std::string& lines,
+                         const std::string& nested = "") {
+  return std::string("{\"error_constant\":\"") + constant +
+         "\",\"file\":\"kosdtools_timescales/timescaleHelpers\",\"line\":" +
+         std::to_string(line) + ",\"component\":\"quillon\",\"kosyncdomain_debug\":{" + lines +
+         "}" + nested + "}";
+}
+
+std::string nestedServiceError(int32_t code) {
+  return ",\"nested_error\":[{\"error_constant\":\"pdmErr\",\"file\":\"pdm/lib\",\"line\":3,"
+         "\"component\":\"quillon\",\"pdm_debug\":{\"m\":\"x\"},\"code\":" +
+         std::to_string(code) + "}]";
+}
+
+std::string thrownBy(const std::function<void()>& call) {
+  try {
+    call();
+  } catch (const koerr::Exception& e) {
+    return e.what();
+  }
+  return "<nothing thrown>";
+}
+
+TEST(TimescaleHelpers, OrdersBoundaryClocksAndTheSelectedSlaveFirstAndMastersLast) {
+  Service service;
+  service.trList = "{\"timeReferences\":[\"a\",\"b\",\"c\",\"d\",\"e\",\"f\",\"g\",\"tr 8\"]}";
+  service.add("a", "IEEE 802.1AS-2011 TAB", "ga", "PTP_SLAVE");
+  service.add("b", "IEEE 1588-2008", "gb", "PTP_MASTER");
+  service.add("c", "IEEE 802.1AS-2011", "gc", "PTP_SLAVE");
+  service.add("d", "IEEE 1588-2008", "gd", "PTP_SLAVE");
+  service.add("e", "IEEE 1588-2019", "ge", "PTP_MASTER");
+  service.add("f", "IEEE 1588-2008 BC", "gf", "PTP_MASTER");
+  service.add("g", "IEEE 802.1AS-2011", "gg", "PTP_DISABLED");
+  service.add("tr 8", "IEEE 1588-2008", "gm A", "PTP_MASTER");
+  service.selected = "c";
+  kosdtools::pendulo::TimescaleHelpers helpers(service.client);
+
+  const std::string prefix = "/quillon/timescales/pendulo/";
+  EXPECT_EQ(helpers.getTimescaleUris(),
+            (Strings{prefix + "f/gf", prefix + "c/gc", prefix + "a/ga", prefix + "b/gb",
+                     prefix + "g/gg", prefix + "tr-8/gm-A"}));
+  EXPECT_EQ(helpers.getFirstTrTimescaleUri(), prefix + "a/ga");
+  EXPECT_EQ(helpers.getFirstTrGmId(), "ga");
+
+  // Selected, but a master: published at the back like any master.
+  service.selected = "b";
+  EXPECT_EQ(helpers.getTimescaleUris(),
+            (Strings{prefix + "f/gf", prefix + "a/ga", prefix + "b/gb", prefix + "g/gg",
+                     prefix + "tr-8/gm-A"}));
+}
+
+TEST(TimescaleHelpers, ComposedOperationsGoThroughOverrides) {
+  Service service;
+  service.trList = "{\"timeReferences\":[\"x\"]}";
+  struct Overriding : kosdtools::pendulo::TimescaleHelpers {
+    using TimescaleHelpers::TimescaleHelpers;
+    std::string getTrGmId(const std::string& trId) override { return "gm of " + trId; }
+    std::string getTrType(const std::string&) override { return "IEEE 1588-2008 BC"; }
+  } helpers(service.client);
+  EXPECT_EQ(helpers.getFirstTrTimescaleUri(), "/quillon/timescales/pendulo/x/gm-of-x");
+  EXPECT_EQ(helpers.getTimescaleUris(), Strings{"/quillon/timescales/pendulo/x/gm-of-x"});
+}
+
+TEST(TimescaleHelpers, TrAttributeErrorsNameTheTrAndKeepTheServiceError) {
+  Service service;
+  kosdtools::pendulo::TimescaleHelpers helpers(service.client);
+  const std::string typeLines = "\"timeReferenceId\":\"t\",\"timeReferenceTypeKey\":\"type\"";
+  struct Case {
+    const char* what;
+    const char* answer;  // null: the service throws `code`
+    int32_t code;
+    std::function<std::string()> read;
+    std::string expected;
+  };
+  const auto type = [&] { return helpers.getTrType("t"); };
+  const auto gm = [&] { return helpers.getTrGmId("t"); };
+  const auto port = [&] { return helpers.getTrPortState("t"); };
+  const Case cases[] = {
+      {"type not set", nullptr, -1074100990, type,
+       helperRecord("koapalerr_resourceNotFound", 214,
+                    "\"message\":\"The specified Pendulo Time Reference has not set a Time "
+                    "Reference Type\"," + typeLines,
+                    nestedServiceError(-1074100990))},
+      {"type of unknown TR", nullptr, -1074100991, type,
+       helperRecord("koapalerr_resourceNotFound", 221,
+                    "\"message\":\"The specified Pendulo Time Reference does not exist.\"," +
+                        typeLines,
+                    nestedServiceError(-1074100991))},
+      {"type not JSON", "type?", 0, type,
+       helperRecord("koapalerr_invalidParameter", 232,
+                    "\"message\":\"Failed to parse typeKey key from trTypeJson.\","
+                    "\"typeKey\":\"type\",\"trTypeJson\":\"type?\"")},
+      {"type null", "{\"type\":null}", 0, type,
+       helperRecord("koapalerr_resourceNotFound", 240,
+                    "\"message\":\"The specified Pendulo Time Reference's Type is null.\"," +
+                        typeLines)},
+      {"type empty", "{\"type\":\"\"}", 0, type,
+       helperRecord("koapalerr_resourceNotFound", 240,
+                    "\"message\":\"The specified Pendulo Time Reference's Type is null.\"," +
+                        typeLines)},
+      {"type a number", "{\"type\":5}", 0, type,
+       "{\"error_constant\":\"errCode\",\"file\":\"kosynctools_cjson/jsonHelperFunctions\","
+       "\"line\":50,\"component\":\"quillon\",\"kosync_debug\":{\"message\":\"Error parsing: "
+       "expected data type does not match the parsed value.\",\"JSON\":\"{\\\"type\\\":5}\","
+       "\"key\":\"type\"}}"},
+      {"gm not set", nullptr, -1074100990, gm,
+       helperRecord("koapalerr_resourceNotFound", 87,
+                    "\"message\":\"The specified Pendulo Time Reference has not set a Grandmaster "
+                    "ID.\",\"timeReferenceId\":\"t\"",
+                    nestedServiceError(-1074100990))},
+      {"gm of unknown TR", nullptr, -1074100991, gm,
+       helperRecord("koapalerr_resourceNotFound", 95,
+                    "\"message\":\"The specified Pendulo Time Reference does not exist.\","
+                    "\"timeReferenceId\":\"t\"",
+                    nestedServiceError(-1074100991))},
+      {"gm member missing", "{\"gm\":\"a\"}", 0, gm,
+       helperRecord("koapalerr_invalidParameter", 106,
+                    "\"message\":\"Failed to parse gmClockId key from gmIdJson.\","
+                    "\"gmClockIdKey\":\"gmClockId\",\"gmIdJson\":\"{\\\"gm\\\":\\\"a\\\"}\"")},
+      {"gm null", "{\"gmClockId\":null}", 0, gm,
+       helperRecord("koapalerr_resourceNotFound", 115,
+                    "\"message\":\"The specified Pendulo Time Reference's Grandmaster ID is "
+                    "null.\",\"timeReferenceId\":\"t\"")},
+      {"port not set", nullptr, -1074100990, port,
+       helperRecord("koapalerr_resourceNotFound", 261,
+                    "\"message\":\"The specified Pendulo Time Reference has not set a Port "
+                    "State\",\"timeReferenceId\":\"t\"",
+                    nestedServiceError(-1074100990))},
+      {"port of unknown TR", nullptr, -1074100991, port,
+       helperRecord("koapalerr_resourceNotFound", 268,
+                    "\"message\":\"The specified Pendulo Time Reference does not exist.\","
+                    "\"timeReferenceId\":\"t\"",
+                    nestedServiceError(-1074100991))},
+      {"port in an array", "[{\"portState\":\"PTP_MASTER\"}]", 0, port,
+       helperRecord("koapalerr_invalidParameter", 279,
+                    "\"message\":\"Failed to parse portStateKey key from trStateJson.\","
+                    "\"portStateKey\":\"portState\",\"trStateJson\":"
+                    "\"[{\\\"portState\\\":\\\"PTP_MASTER\\\"}]\"")},
+      {"port empty", "{\"portState\":\"\"}", 0, port,
+       helperRecord("koapalerr_resourceNotFound", 287,
+                    "\"message\":\"The specified Pendulo Time Reference's Port State is "
+                    "null.\",\"timeReferenceId\":\"t\"")},
+      {"other service errors pass unchanged", nullptr, -1074100000, port,
+       "{\"error_constant\":\"pdmErr\",\"file\":\"pdm/lib\",\"line\":3,\"component\":\"quillon\","
+       "\"pdm_debug\":{\"m\":\"x\"}}"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    EXPECT_CALL(*service.client, getTrAttrJson("t", _, _))
+        .WillOnce(Invoke([&](const std::string&, const std::string&, std::string* out) {
+          if (c.answer == nullptr) Service::raiseServiceError(c.code);
+          *out = c.answer;
+        }));
+    EXPECT_EQ(thrownBy([&] { (void)c.read(); }), c.expected);
+  }
+}
+
+TEST(TimescaleHelpers, TrListsAreReadLenientlyButNeverGuessed) {
+  Service service;
+  kosdtools::pendulo::TimescaleHelpers helpers(service.client);
+  const std::string olderService =
+      "\"message\":\"Pendulo does not have the specified attr; maybe the target is running an "
+      "older version of Pendulo.\",\"attrKey\":\"timeReferences\"";
+  const auto listError = [](const std::string& list) {
+    return helperRecord("koapalerr_invalidParameter", 193,
+                        "\"message\":\"Failed to parse TR IDs from TR list JSON.\","
+                        "\"trListJson\":\"" + list + "\",\"trIds\":\"timeReferences\"");
+  };
+  const auto firstError = [](const std::string& list) {
+    return helperRecord("koapalerr_invalidParameter", 160,
+                        "\"message\":\"Failed to parse TR ID from TR list JSON or TR list is "
+                        "empty.\",\"trListJson\":\"" + list + "\",\"trId\":\"timeReferences\"");
+  };
+
+  service.trList = "{\"timeReferences\":null}";
+  EXPECT_TRUE(helpers.getTrIds().empty());
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getFirstTrId(); }),
+            firstError("{\\\"timeReferences\\\":null}"));
+  service.trList = "{\"timeReferences\":[]}";
+  EXPECT_TRUE(helpers.getTrIds().empty());
+  EXPECT_TRUE(helpers.getTimescaleUris().empty());
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getFirstTrId(); }),
+            firstError("{\\\"timeReferences\\\":[]}"));
+  service.trList = "{\"trs\":[\"a\"]}";
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }), listError("{\\\"trs\\\":[\\\"a\\\"]}"));
+  service.trList = "";
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }), listError(""));
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getFirstTrId(); }), firstError(""));
+
+  service.trList = "{\"timeReferences\":\"a\"}";
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }),
+            "{\"error_constant\":\"jsonErrorsNotAnArray\",\"file\":\"kojsonlh/cJSONUtils\","
+            "\"line\":83,\"component\":\"quillon\"}");
+  service.trList = "{\"timeReferences\":[\"a\",1]}";
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }),
+            "{\"error_constant\":\"jsonErrorsTypeMismatch\",\"file\":\"kojsonlh/cJSONUtils\","
+            "\"line\":305,\"component\":\"quillon\"}");
+
+  ON_CALL(*service.client, getPdmAttrJson(_, _))
+      .WillByDefault(Invoke([](const std::string&, std::string*) {
+        Service::raiseServiceError(-1074100990);
+      }));
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }),
+            helperRecord("koapalerr_resourceNotFound", 182, olderService,
+                         nestedServiceError(-1074100990)));
+  EXPECT_EQ(thrownBy([&] { (void)helpers.getFirstTrGmId(); }),
+            helperRecord("koapalerr_resourceNotFound", 146, olderService,
+                         nestedServiceError(-1074100990)));
+}
+
+TEST(TimescaleHelpers, SelectedSlaveNeedsBothTheSelectionAndTheSlavePort) {
+  Service service;
+  service.add("s", "IEEE 1588-2008", "g", "PTP_SLAVE");
+  service.add("m", "IEEE 1588-2008", "g", "PTP_MASTER");
+  kosdtools::pendulo::TimescaleHelpers helpers(service.client);
+  EXPECT_FALSE(helpers.isTrSelectedSlave("s"));  // nothing selected
+  service.selected = "m";
+  EXPECT_FALSE(helpers.isTrSelectedSlave("s"));
+  EXPECT_FALSE(helpers.isTrSelectedSlave("m"));
+  EXPECT_TRUE(helpers.isTrMasterOrDisabled("m"));
+  service.selected = "s";
+  EXPECT_TRUE(helpers.isTrSelectedSlave("s"));
+  EXPECT_FALSE(helpers.isTrMasterOrDisabled("s"));
+}
+
+TEST(TimescaleHelpers, NormalizingDropsTheRemoteHostOnly) {
+  Service service;
+  kosdtools::pendulo::TimescaleHelpers helpers(service.client);
+  EXPECT_EQ(helpers.normalizeTimescaleUri("/host/quillon/timescales/pendulo/tr 0/gm0/"),
+            "/quillon/timescales/pendulo/tr 0/gm0");
+  EXPECT_EQ(thrownBy([&] { (void)helpers.normalizeTimescaleUri("/quillon/timescales/pendulo/a/b"); }),
+            "{\"error_constant\":\"koapalerr_invalidParameter\",\"file\":\"kosdtools_curl/"
+            "webHelperFunctions\",\"line\":207,\"component\":\"quillon\",\"kosyncdomain_debug\":"
+            "{\"message\":\"Failed to parse URI; more keys than URI parts.\",\"uri\":\"/quillon/"
+            "timescales/pendulo/a/b\",\"uriKeys.size()\":6}}");
+  std::string text = " a b ";
+  EXPECT_EQ(&helpers.replaceSpacesWithDashes(text), &text);
+  EXPECT_EQ(text, "-a-b-");
+}
+
+}  // namespace
