@@ -329,8 +329,8 @@ int32_t TimeService::getTrMetadataJson(const char* trId, char* buffer, uint32_t 
 // The common frame of the state-changing calls: checks, the call's fault,
 // then `apply(state, status)` under the exclusive lock.
 template <typename Change>
-int32_t TimeService::change(Call call, std::string_view trId, koerr::Status* status,
-                            Change&& apply) {
+int32_t TimeService::change(Call call, std::string_view trId, std::string_view key,
+                            koerr::Status* status, Change&& apply) {
   if (pollFile_) reloadIfFileChanged();
   std::unique_lock<std::shared_mutex> lock(mutex_);
   if (!state_.usable) return unavailable(state_, call, *status);
@@ -339,10 +339,10 @@ int32_t TimeService::change(Call call, std::string_view trId, koerr::Status* sta
   if (!serviceCall) {
     if (int32_t code = unavailable(state_, call, *status)) return code;
   }
-  const Fault* fault = state_.live.findFault(call, trId);
-  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, {});
+  const Fault* fault = state_.live.findFault(call, trId, key);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, key);
   if (int32_t code = apply(state_, *status)) return code;
-  return fault != nullptr ? reportFault(*status, *fault, trId, {}) : 0;
+  return fault != nullptr ? reportFault(*status, *fault, trId, key) : 0;
 }
 
 int32_t TimeService::setTrAttr(const char* trId, const char* key, const char* value,
@@ -354,7 +354,7 @@ int32_t TimeService::setTrAttr(const char* trId, const char* key, const char* va
   }
   // Rendered before taking the lock: parsing the value is the slow part.
   std::string answer = renderMember(key, valueFromText(value));
-  return change(kCall, trId, status, [&](State& state, koerr::Status& st) {
+  return change(kCall, trId, key, status, [&](State& state, koerr::Status& st) {
     const auto tr = state.live.trs.find(std::string_view(trId));
     if (tr == state.live.trs.end()) return reportNoTr(st, kCall, trId);
     tr->second.attrAnswers[key] = std::move(answer);
@@ -364,7 +364,7 @@ int32_t TimeService::setTrAttr(const char* trId, const char* key, const char* va
 
 int32_t TimeService::restartService(koerr::Status* status) {
   if (status == nullptr) return kInvalidArgument;
-  return change(Call::kRestartService, {}, status, [](State& state, koerr::Status&) {
+  return change(Call::kRestartService, {}, {}, status, [](State& state, koerr::Status&) {
     state.live.trs = state.saved;
     state.up = true;
     return 0;
@@ -373,7 +373,7 @@ int32_t TimeService::restartService(koerr::Status* status) {
 
 int32_t TimeService::bringDownService(koerr::Status* status) {
   if (status == nullptr) return kInvalidArgument;
-  return change(Call::kBringDownService, {}, status, [](State& state, koerr::Status&) {
+  return change(Call::kBringDownService, {}, {}, status, [](State& state, koerr::Status&) {
     state.up = false;
     return 0;
   });
@@ -381,7 +381,7 @@ int32_t TimeService::bringDownService(koerr::Status* status) {
 
 int32_t TimeService::bringUpService(koerr::Status* status) {
   if (status == nullptr) return kInvalidArgument;
-  return change(Call::kBringUpService, {}, status, [](State& state, koerr::Status&) {
+  return change(Call::kBringUpService, {}, {}, status, [](State& state, koerr::Status&) {
     state.up = true;
     return 0;
   });
@@ -389,7 +389,7 @@ int32_t TimeService::bringUpService(koerr::Status* status) {
 
 int32_t TimeService::persistConfig(koerr::Status* status) {
   if (status == nullptr) return kInvalidArgument;
-  return change(Call::kPersistConfig, {}, status, [](State& state, koerr::Status&) {
+  return change(Call::kPersistConfig, {}, {}, status, [](State& state, koerr::Status&) {
     state.saved = state.live.trs;
     return 0;
   });
@@ -399,7 +399,7 @@ int32_t TimeService::updateTrFromConfig(const char* trId, koerr::Status* status)
   constexpr Call kCall = Call::kUpdateTrFromConfig;
   if (status == nullptr) return kInvalidArgument;
   if (trId == nullptr) return reportInvalidArgument(*status, kCall, "No TR.");
-  return change(kCall, trId, status, [&](State& state, koerr::Status& st) {
+  return change(kCall, trId, {}, status, [&](State& state, koerr::Status& st) {
     const auto live = state.live.trs.find(std::string_view(trId));
     const auto saved = state.saved.find(std::string_view(trId));
     if (live == state.live.trs.end() || saved == state.saved.end()) {
@@ -413,7 +413,7 @@ int32_t TimeService::updateTrFromConfig(const char* trId, koerr::Status* status)
 int32_t TimeService::adjustTime(int64_t seconds, int64_t nanoseconds, koerr::Status* status) {
   constexpr Call kCall = Call::kAdjustTime;
   if (status == nullptr) return kInvalidArgument;
-  return change(kCall, {}, status, [&](State& state, koerr::Status& st) {
+  return change(kCall, {}, {}, status, [&](State& state, koerr::Status& st) {
     int64_t step;
     int64_t offset;
     if (__builtin_mul_overflow(seconds, int64_t{1000000000}, &step) ||

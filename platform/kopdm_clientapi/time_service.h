@@ -82,7 +82,8 @@ class TimeService {
                     std::string_view key, char* buffer, uint32_t capacity,
                     koerr::Status& status) const;
   template <typename Change>
-  int32_t change(Call call, std::string_view trId, koerr::Status* status, Change&& apply);
+  int32_t change(Call call, std::string_view trId, std::string_view key, koerr::Status* status,
+                 Change&& apply);
 
   int32_t reportInvalidArgument(koerr::Status& status, Call call, const char* problem) const;
   int32_t reportFault(koerr::Status& status, const Fault& fault, std::string_view trId,

@@ -3,7 +3,9 @@
 #include <cjson/cJSON.h>
 #include <gtest/gtest.h>
 
+#include <fstream>
 #include <functional>
+#include <sstream>
 #include <memory>
 #include <string>
 #include <thread>
@@ -253,6 +255,74 @@ TEST_F(AgainstStandIn, ConcurrentReadersSeeWholeStatesWhileOthersChangeThem) {
     wrapper->setTrAttr("idle3", "portState", i % 2 ? "PTP_MASTER" : "PTP_SLAVE");
   }
   for (std::thread& reader : readers) reader.join();
+}
+
+// Each example is served with a marker in place of its metadata, so the test
+// knows when the stand-in has taken it; the rest is the example as shipped.
+TEST_F(AgainstStandIn, ExampleScenariosAreServedAsDocumented) {
+  const std::string prefix = "/quillon/timescales/pendulo/";
+  struct Example {
+    const char* name;
+    Strings uris;
+    int32_t code;  // the error getTimescaleUris raises instead, if any
+  };
+  const Example examples[] = {
+      {"default", {prefix + "tr1/00-1B-21-FF-FE-AB-CD-EF", prefix + "tr0/00-80-2F-FF-FE-12-34-56",
+                   prefix + "tr2/00-80-2F-FF-FE-65-43-21"}, 0},
+      {"many_references", {prefix + "cell-uplink/gm-cell-1", prefix + "tab/00-1B-21-FF-FE-00-00-0A",
+                           prefix + "off/00-80-2F-FF-FE-00-00-0D"}, 0},
+      {"faults", {}, -52005},
+      {"older_service", {}, -52006},
+  };
+  for (const Example& example : examples) {
+    SCOPED_TRACE(example.name);
+    std::ifstream file(std::string(QUILLON_EXAMPLE_SCENARIOS) + "/" + example.name + ".json");
+    std::stringstream text;
+    text << file.rdbuf();
+    Record scenario(text.str().c_str());
+    ASSERT_NE(scenario.root, nullptr);
+    const std::string marker = std::string("{\"example\":\"") + example.name + "\"}";
+    cJSON_DeleteItemFromObjectCaseSensitive(scenario.root, "pdmMetadata");
+    cJSON_AddItemToObject(scenario.root, "pdmMetadata", cJSON_Parse(marker.c_str()));
+    char* marked = cJSON_PrintUnformatted(scenario.root);
+    timesvc_test::installRaw(marked, [&] {
+      std::string metadata;
+      try {
+        wrapper->getPdmMetadataJson(&metadata);
+      } catch (const koerr::Exception&) {
+      }
+      return metadata == marker;
+    });
+    cJSON_free(marked);
+    try {
+      EXPECT_EQ(helpers.getTimescaleUris(), example.uris);
+      EXPECT_EQ(example.code, 0);
+    } catch (const koerr::Exception& e) {
+      EXPECT_EQ(e.code(), example.code) << e.what();
+    }
+  }
+}
+
+TEST_F(AgainstStandIn, LibraryRefusesUnusableArgumentsWithARecord) {
+  install(kFourTrs);
+  constexpr int32_t kInvalidArgument = -1074100994;
+  EXPECT_EQ(kopdmclientapi_getPdmMetadataJson(nullptr, 16, nullptr), kInvalidArgument);
+  char buffer[4] = {'a', 'b', 'c', 'd'};
+  koerr::Status status;
+  EXPECT_EQ(kopdmclientapi_getTrAttrJson("bc2", nullptr, buffer, 4, &status), kInvalidArgument);
+  EXPECT_EQ(status.code, kInvalidArgument);
+  EXPECT_EQ(Record(status.json).text("call", Record(status.json).at("kopdmclientapi_debug")),
+            "getTrAttrJson");
+  koerr::releaseText(status);
+  status = koerr::Status();
+  EXPECT_EQ(kopdmclientapi_getTrAttrJson("bc2", "type", buffer, 0, &status), kInvalidArgument);
+  koerr::releaseText(status);
+  status = koerr::Status();
+  // Capacity 1 holds the terminator only; nothing past the capacity is written.
+  EXPECT_EQ(kopdmclientapi_getTrAttrJson("bc2", "type", buffer, 1, &status), 0);
+  EXPECT_EQ(std::string(buffer, 4), std::string("\0bcd", 4));
+  EXPECT_EQ(kopdmclientapi_adjustTime(INT64_MAX, 0, &status), kInvalidArgument);
+  koerr::releaseText(status);
 }
 
 TEST(ApiWrapper, MissingOutParametersAreRefusedBeforeTheLibraryIsCalled) {
