@@ -62,7 +62,6 @@ TEST(Binding, FullTableBindsTheRealTransferFunctions) {
 
   // The non-variadic forms pass each kind of value through.
   ASSERT_EQ(table->global_init(CURL_GLOBAL_DEFAULT), CURLE_OK);
-  EXPECT_TRUE(startsWith(table->version(), "libcurl/"));
   CURL* easy = table->easy_init();
   ASSERT_NE(easy, nullptr);
   char url[] = "http://127.0.0.1:1/x";
@@ -78,9 +77,6 @@ TEST(Binding, FullTableBindsTheRealTransferFunctions) {
   char* effective = nullptr;
   ASSERT_EQ(table->easy_getinfo(easy, CURLINFO_EFFECTIVE_URL, &effective), CURLE_OK);
   EXPECT_STREQ(effective, url);
-  char* escaped = table->easy_escape(easy, "a b/c", 0);
-  EXPECT_STREQ(escaped, "a%20b%2Fc");
-  table->free(escaped);
 
   curl_httppost* first = nullptr;
   curl_httppost* last = nullptr;

@@ -2,11 +2,11 @@
 
 #include <gtest/gtest.h>
 #include <stdlib.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cmath>
 #include <cstdio>
+#include <filesystem>
 #include <string>
 
 #include "ko/dsc/osdep/os_exception.h"
@@ -18,8 +18,7 @@ TEST(LibrarySearchPath, ComponentFolderFirstThenDirectoryThenTheSystemLoader) {
   char base[] = "/tmp/ko_dsc_lib_XXXXXX";
   const std::string dir = mkdtemp(base);
   const std::string other = dir + "/other";
-  ASSERT_EQ(mkdir(other.c_str(), 0700), 0);
-  ASSERT_EQ(mkdir((other + "/kocurl").c_str(), 0700), 0);
+  std::filesystem::create_directories(other + "/kocurl");
   auto touch = [](const std::string& path) { std::fclose(std::fopen(path.c_str(), "w")); };
   touch(dir + "/libx.so.13");
   touch(other + "/kocurl/libx.so.13");
@@ -35,11 +34,7 @@ TEST(LibrarySearchPath, ComponentFolderFirstThenDirectoryThenTheSystemLoader) {
   unsetenv(LibrarySearchPath::kVariable);
   EXPECT_EQ(LibrarySearchPath::fromEnvironment().locate("kocurl", "libx.so.13"), "libx.so.13");
 
-  std::remove((other + "/kocurl/libx.so.13").c_str());
-  std::remove((dir + "/libx.so.13").c_str());
-  rmdir((other + "/kocurl").c_str());
-  rmdir(other.c_str());
-  rmdir(dir.c_str());
+  std::filesystem::remove_all(dir);
 }
 
 TEST(SharedLibrary, ResolvesSymbolsAndRaisesOSExceptionWithTheLoaderText) {
