@@ -9,4 +9,10 @@ if [ ! -x "$host" ]; then
   echo "run: $host is not built yet" >&2
   exit 1
 fi
+# The plug-in finds its explanation texts through a marker file naming the
+# shared-data directory; point it at the source tree's data instead of the
+# installed location, so error answers carry a real "errorText".
+marker="$root/$build/share.dir"
+printf '%s\n' "$root/data/share" > "$marker"
+export KOSYSQ_SHARE_DIR_FILE="$marker"
 exec "$host" --listen "$listen"

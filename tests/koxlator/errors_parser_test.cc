@@ -1,0 +1,228 @@
+#include "koxlator/errors_parser.h"
+
+#include <dirent.h>
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <filesystem>
+
+#include "answers_common/fixtures.h"
+
+namespace {
+
+using answers_test::OwnedStatus;
+using answers_test::parses;
+using answers_test::ScopedEnv;
+using answers_test::ScratchDir;
+
+const std::string kHead = "<?xml version=\"1.0\"?>\n<kodocument>\n";
+
+std::string entry(const std::string& code, const std::string& body) {
+  return "<koerror code=\"" + code + "\">\n" + body + "</koerror>\n";
+}
+
+std::string lookupIn(const std::string& file, int32_t code, OwnedStatus& status) {
+  std::string text = "stale";
+  koxlator::readExplanationFile(file, code, text, status);
+  return text;
+}
+
+TEST(ErrorsParserTest, FindsEntriesWhateverTheirSpelling) {
+  ScratchDir dir;
+  const std::string lf = dir.write(
+      "lf.txt",
+      "<?XML VERSION=\"1.0\" encoding=\"UTF-8\"?>\n<KODOCUMENT>\n"
+      "<kocomment>\n" + entry("7", "inside a comment\n") + "</kocomment> closes here\n"
+      "<KOERROR CODE=\"-52005\">\nInvalid parameter.\n</KoError>\n" +
+      entry("0x10", "Sixteen,\non two lines.\n\n") +
+      "  <koerror code=\"5\">\nindented, so never an entry\n</koerror>\n"
+      "free text between entries\n"
+      "<koerror code=\"12\">text on the tag line\nbody\n</koerror> and after it\n" +
+      entry("010", "octal eight\n") +
+      // A 1023-byte piece fills the line buffer; the rest of that line then
+      // arrives as a line of its own, which here ends the entry.
+      "<koerror code=\"13\">\n" + std::string(1023, 'x') + "</koerror>\n"
+      "</kodocument>\n" + entry("99", "after the end\n"));
+  const std::string crlf = dir.write(
+      "crlf.txt", "<?xml version=\"1.0\"?>\r\n<kodocument>\r\n<koerror code=\"1\">\r\n"
+                  "line one\r\nline two\r\n\r\n</koerror>\r\n</kodocument>\r\n");
+  struct Case {
+    const std::string* file;
+    int32_t code;
+    std::string expected;
+  };
+  const Case cases[] = {
+      {&lf, -52005, "Invalid parameter."},
+      {&lf, 16, "Sixteen,\non two lines."},
+      {&lf, 7, ""},
+      {&lf, 5, ""},
+      {&lf, 12, "body"},
+      {&lf, 8, "octal eight"},
+      {&lf, 13, std::string(1023, 'x')},
+      {&lf, 99, ""},
+      {&crlf, 1, "line one\r\nline two"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(*c.file + " code " + std::to_string(c.code));
+    OwnedStatus status;
+    EXPECT_EQ(lookupIn(*c.file, c.code, status), c.expected);
+    EXPECT_EQ(status.code, 0);
+    EXPECT_EQ(status.json, nullptr);
+  }
+}
+
+TEST(ErrorsParserTest, FilesOfAnotherKindAreSkippedQuietly) {
+  ScratchDir dir;
+  const std::string body = entry("1", "one\n") + "</kodocument>\n";
+  const std::string contents[] = {
+      "", "<?xml version=\"1.0\"?>\n", "<?xml version=\"1.1\"?>\n<kodocument>\n" + body,
+      "<?xml version=\"1.0\"?>\n<document>\n" + body, "<?xml version=\"1.0\"?>\n <kodocument>\n" + body};
+  int index = 0;
+  for (const std::string& content : contents) {
+    SCOPED_TRACE(content);
+    OwnedStatus status;
+    EXPECT_EQ(lookupIn(dir.write("f" + std::to_string(index++) + ".txt", content), 1, status), "");
+    EXPECT_EQ(status.code, 0);
+  }
+}
+
+TEST(ErrorsParserTest, MalformedFilesAreReportedExactly) {
+  ScratchDir dir;
+  const std::string prefix =
+      "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"koxlator/gxErrorsParser\",";
+  struct Case {
+    const char* name;
+    std::string content;  // empty: the file does not exist
+    std::string expected;
+  };
+  const Case cases[] = {
+      {"missing", "",
+       prefix + "\"line\":148,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
+                "\"Could not open status explanations file\",\"path\":\"" + dir.str() + "/missing\"}}"},
+      {"no end tag", kHead + "<koerror code=\"1\">\none\n",
+       prefix + "\"line\":208,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
+                "\"Bad explanation file. Could not find the end of the status code definition !\"}}"},
+      {"NUL line", kHead + entry("2", "two\n") + std::string("\0heading\n", 9) + entry("1", "one\n"),
+       prefix + "\"line\":229,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
+                "\"Bad explanation file. Unidentified section heading !\"}}"},
+      {"unreadable code", kHead + entry("one", "one\n"),
+       prefix + "\"line\":176,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
+                "\"Could not successfully read the status data!\",\"sscanf\":0}}"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.name);
+    const std::string path =
+        c.content.empty() ? dir.str() + "/missing" : dir.write(c.name, c.content);
+    OwnedStatus status;
+    EXPECT_EQ(lookupIn(path, 1, status), "");
+    EXPECT_EQ(status.code, -52006);
+    EXPECT_TRUE(parses(status.text()));
+    EXPECT_EQ(status.text(), c.expected);
+  }
+}
+
+// The name listed first in `directory` among `names`.
+std::string firstListed(const std::string& directory, const std::string& a, const std::string& b) {
+  DIR* listing = opendir(directory.c_str());
+  std::string first;
+  while (const dirent* e = readdir(listing)) {
+    if (e->d_name == a || e->d_name == b) {
+      first = e->d_name;
+      break;
+    }
+  }
+  closedir(listing);
+  return first;
+}
+
+TEST(ErrorsParserTest, SearchesLanguageDirectoryThenItsParent) {
+  ScratchDir dir;
+  const std::string errors = dir.str() + "/errors";
+  dir.write("errors/English/a.txt", kHead + entry("1", "first a\n") + entry("3", "three\n"));
+  dir.write("errors/English/b.err", kHead + entry("1", "first b\n") + entry("4", "four\n"));
+  dir.write("errors/English/c.md", kHead + entry("5", "not an explanation file\n"));
+  dir.write("errors/English/sub.txt/d.txt", kHead + entry("6", "in a subdirectory\n"));
+  dir.write("errors/parent.txt", kHead + entry("2", "from the parent\n") + entry("3", "shadowed\n"));
+  const std::string winner = firstListed(errors + "/English", "a.txt", "b.err");
+
+  ScopedEnv marker("KOSYSQ_SHARE_DIR_FILE", dir.write("share.dir", dir.str() + "/\n"));
+  OwnedStatus dirStatus;
+  std::string directory;
+  koxlator::errorsDirectory(directory, dirStatus);
+  EXPECT_EQ(directory, errors);
+
+  struct Case {
+    int32_t code;
+    std::string expected;
+  };
+  const Case cases[] = {{1, winner == "a.txt" ? "first a" : "first b"}, {2, "from the parent"},
+                        {3, "three"}, {4, "four"}, {5, ""}, {6, ""}};
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.code);
+    OwnedStatus status;
+    std::string text = "stale";
+    koxlator::lookupExplanation(errors, c.code, koxlator::kEnglish, text, status);
+    EXPECT_EQ(text, c.expected);
+    EXPECT_EQ(status.code, 0);
+  }
+}
+
+TEST(ErrorsParserTest, DirectoryFailuresStopTheLookup) {
+  ScratchDir dir;
+  dir.write("errors/parent.txt", kHead + entry("2", "from the parent\n"));
+  const std::string errors = dir.str() + "/errors";
+  const std::string noEnglish =
+      "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"koxlator/koxlator_internal\","
+      "\"line\":63,\"component\":\"quillon\",\"internal_error\":{\"api\":\"errno\",\"code\":2,"
+      "\"string\":\"" + std::string(std::strerror(ENOENT)) + "\"},\"koxlator_debug\":{\"debug\":"
+      "\"open dir failed\",\"path\":\"" + errors + "/English\"}}";
+  const std::string badLanguage =
+      "{\"error_constant\":\"koapalerr_invalidParameter\",\"file\":\"koxlator/gxErrorsParser\","
+      "\"line\":43,\"component\":\"quillon\",\"koxlator_debug\":{\"gxerrorsparser\":"
+      "\"invalid language\",\"lang\":6}}";
+  const std::string dangling =
+      "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"koxlator/gxErrorsParser\","
+      "\"line\":96,\"component\":\"quillon\",\"internal_error\":{\"api\":\"errno\",\"code\":2,"
+      "\"string\":\"" + std::string(std::strerror(ENOENT)) + "\"},\"koxlator_debug\":{\"koxlator\":"
+      "\"get file info failed\",\"path\":\"" + errors + "/English/gone.txt\"}}";
+  struct Case {
+    const char* name;
+    uint32_t language;
+    bool breakEnglish;
+    std::string expected;
+  };
+  // The explanation sits in the parent all along: no failure falls back to it.
+  const Case cases[] = {{"no English subdirectory", 0, false, noEnglish},
+                        {"language out of range", 6, false, badLanguage},
+                        {"dangling link in English", 0, true, dangling}};
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.name);
+    if (c.breakEnglish) {
+      std::filesystem::create_directories(errors + "/English");
+      std::filesystem::create_symlink(dir.str() + "/nowhere", errors + "/English/gone.txt");
+    }
+    OwnedStatus status;
+    std::string text = "stale";
+    koxlator::lookupExplanation(errors, 2, c.language, text, status);
+    EXPECT_EQ(text, "");
+    EXPECT_LT(status.code, 0);
+    EXPECT_TRUE(parses(status.text()));
+    EXPECT_EQ(status.text(), c.expected);
+  }
+}
+
+TEST(ErrorsParserTest, ShippedFileExplainsEveryCodeTheServiceReports) {
+  const int32_t codes[] = {-411200, -411145, -411203, -52000, -52004, -52005,
+                           -52006,  -52008,  -1074100990, -1074100991};
+  for (int32_t code : codes) {
+    SCOPED_TRACE(code);
+    OwnedStatus status;
+    std::string text;
+    koxlator::lookupExplanation(QUILLON_SHARE_DIR "/errors", code, koxlator::kEnglish, text, status);
+    EXPECT_EQ(status.code, 0);
+    EXPECT_GT(text.size(), 20u);
+    EXPECT_EQ(text.find('\n'), std::string::npos) << "one paragraph per code";
+  }
+}
+
+}  // namespace
