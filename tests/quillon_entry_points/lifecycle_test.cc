@@ -1,0 +1,152 @@
+// Init, Run and Finalize over substitute graph objects, watching the wrapper
+// singleton and the services they make and delete.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <stdexcept>
+#include <string>
+
+#include "kosdtools_timescales/timescale_helpers.h"
+#include "quillon/plugin_lifecycle.h"
+#include "ws_runtime/exchange.h"
+
+namespace {
+
+class StubWrapper : public kopendulo::ApiWrapperInterface {
+ public:
+  MOCK_METHOD(int32_t, getApiVersion, (), (override));
+  MOCK_METHOD(bool, getSelectedTrId, (std::string*), (override));
+  MOCK_METHOD(int32_t, getSelectedTrOffsetNanos, (int64_t*), (override));
+  MOCK_METHOD(void, getPdmAttrJson, (const std::string&, std::string*), (override));
+  MOCK_METHOD(void, getPdmMetadataJson, (std::string*), (override));
+  MOCK_METHOD(void, getTrAttrJson, (const std::string&, const std::string&, std::string*),
+              (override));
+  MOCK_METHOD(void, getTrMetadataJson, (const std::string&, std::string*), (override));
+  MOCK_METHOD(void, setTrAttr, (const std::string&, const std::string&, const std::string&),
+              (override));
+  MOCK_METHOD(void, restartService, (), (override));
+  MOCK_METHOD(void, bringDownService, (), (override));
+  MOCK_METHOD(void, bringUpService, (), (override));
+  MOCK_METHOD(void, persistConfig, (), (override));
+  MOCK_METHOD(void, updateTrFromConfig, (const std::string&), (override));
+  MOCK_METHOD(int32_t, adjustTime, (int64_t, int64_t), (override));
+};
+
+// Answers the listing with the filter it was given; counts its lifetimes.
+class CountingResourceManager : public quillon::ResourceManagerInterface {
+ public:
+  CountingResourceManager(std::shared_ptr<kosdtools::pendulo::TimescaleHelpersInterface> helpers,
+                          int& destroyed)
+      : helpers_(std::move(helpers)), destroyed_(destroyed) {}
+  ~CountingResourceManager() override { ++destroyed_; }
+  std::string getResources(const std::string& resourceType) override {
+    return "{\"filter\":\"" + resourceType + "\"}";
+  }
+  std::string getSyncableDevice(const std::string&) override { return "{}"; }
+  std::string getTimescale(const std::string&) override { return "{}"; }
+  void putSyncableDevice(const std::string&, const std::string&) override {}
+
+ private:
+  std::shared_ptr<kosdtools::pendulo::TimescaleHelpersInterface> helpers_;
+  int& destroyed_;
+};
+
+class LifecycleTest : public ::testing::Test {
+ protected:
+  quillon::GraphFactories factories() {
+    quillon::GraphFactories graph;
+    graph.wrapper = [this] {
+      ++wrappersMade;
+      return std::make_shared<::testing::StrictMock<StubWrapper>>();
+    };
+    graph.helpers = [](std::shared_ptr<kopendulo::ApiWrapperInterface> wrapper) {
+      return std::make_shared<kosdtools::pendulo::TimescaleHelpers>(std::move(wrapper));
+    };
+    graph.resourceManager = [this](auto helpers) {
+      if (failNextGraph) throw std::runtime_error("no graph today");
+      ++managersMade;
+      return std::make_shared<CountingResourceManager>(std::move(helpers), managersDestroyed);
+    };
+    return graph;
+  }
+
+  int wrappersMade = 0;
+  int managersMade = 0;
+  int managersDestroyed = 0;
+  bool failNextGraph = false;
+  quillon::PluginLifecycle lifecycle{factories()};
+};
+
+TEST_F(LifecycleTest, SecondInitReplacesTheServiceAndReusesTheWrapper) {
+  lifecycle.init();
+  const quillon::Service* first = lifecycle.service();
+  const auto wrapper = lifecycle.wrapper();
+  ASSERT_NE(first, nullptr);
+  ASSERT_NE(wrapper, nullptr);
+
+  lifecycle.init();
+  EXPECT_NE(lifecycle.service(), first);
+  EXPECT_EQ(lifecycle.wrapper(), wrapper);
+  EXPECT_EQ(wrappersMade, 1);
+  EXPECT_EQ(managersMade, 2);
+  EXPECT_EQ(managersDestroyed, 1);
+
+  // A graph that fails to build leaves the working one in place, silently.
+  failNextGraph = true;
+  const quillon::Service* current = lifecycle.service();
+  lifecycle.init();
+  EXPECT_EQ(lifecycle.service(), current);
+  EXPECT_EQ(managersDestroyed, 1);
+}
+
+TEST_F(LifecycleTest, FinalizeReleasesTheGraphOnceAndANewInitMakesANewWrapper) {
+  lifecycle.finalize();  // before any Init
+  EXPECT_EQ(lifecycle.service(), nullptr);
+
+  lifecycle.init();
+  lifecycle.finalize();
+  EXPECT_EQ(lifecycle.service(), nullptr);
+  EXPECT_EQ(lifecycle.wrapper(), nullptr);  // expired with its graph
+  EXPECT_EQ(managersDestroyed, 1);
+  lifecycle.finalize();
+  EXPECT_EQ(managersDestroyed, 1);
+
+  lifecycle.init();
+  EXPECT_EQ(wrappersMade, 2);
+  EXPECT_NE(lifecycle.wrapper(), nullptr);
+}
+
+TEST_F(LifecycleTest, RunAnswersThroughTheServiceAndSurvivesBadRequests) {
+  ws::runtime::Exchange exchange;
+  lifecycle.run(exchange.info(), exchange.id());
+  EXPECT_EQ(exchange.response().code, 503) << "no service before Init";
+  EXPECT_TRUE(exchange.response().body.empty());
+
+  lifecycle.init();
+  exchange.reset();
+  exchange.request().method = "GET";
+  exchange.request().command = U"resources";
+  exchange.request().addVariable(U"resourceType", U"timescales");
+  lifecycle.run(exchange.info(), exchange.id());
+  EXPECT_EQ(exchange.response().code, 200);
+  EXPECT_EQ(exchange.response().mimeType, "vnd.ko.syncDomain.v0/json; charset=utf-8");
+  EXPECT_NE(exchange.response().body.find("\"result\":{\"filter\":\"timescales\"}"),
+            std::string::npos)
+      << exchange.response().body;
+
+  // A null request object answers nothing and returns normally.
+  exchange.reset();
+  lifecycle.run(nullptr, exchange.id());
+  EXPECT_EQ(exchange.response().code, 200);
+  EXPECT_TRUE(exchange.response().body.empty());
+  EXPECT_FALSE(exchange.response().hasMimeType);
+
+  // A request whose every host call fails (its id is stale) is swallowed.
+  const uint32_t stale = exchange.id();
+  exchange.reset();
+  lifecycle.run(exchange.info(), stale);
+  EXPECT_TRUE(exchange.response().body.empty());
+}
+
+}  // namespace
