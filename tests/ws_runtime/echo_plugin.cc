@@ -7,8 +7,9 @@
 //   silent  sets and writes nothing
 //   gate    blocks until the FIFO named by ECHO_PLUGIN_GATE reaches end of
 //           file, then answers "released"
-//   fixed   reads the request the way a real service does and answers a fixed
-//           200-byte JSON document at once
+//   fixed, resources
+//           read the request the way a real service does and answer a fixed
+//           200-byte JSON document at once (the benchmarks' immediate plug-in)
 // Init and Finalize append "init" and "finalize" lines to the file named by
 // ECHO_PLUGIN_LOG, so a test can see that each ran once; "gate" appends
 // "gate-entered" and "gate-left".
@@ -165,7 +166,7 @@ ECHO_EXPORT void echoRun(ws::runtime::RequestInfo* info, uint32_t id) {
     status(*info, id);
   } else if (command == U"gate") {
     gate(id);
-  } else if (command == U"fixed") {
+  } else if (command == U"fixed" || command == U"resources") {
     fixed(*info, id);
   } else if (command != U"silent") {
     SetHTTPResponseCode_KO_GXWS_(id, 404);

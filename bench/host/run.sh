@@ -1,0 +1,124 @@
+#!/usr/bin/env bash
+# Compares the ws-runtime host with nginx serving the same answer as a static
+# file: wrk -t1 for 5 s at 16 and 64 connections, host and nginx taking turns,
+# ROUNDS times (default 3). Targets:
+#   immediate  ws-runtime + the echo plug-in's fixed 200-byte answer (/echo/resources)
+#   quillon    ws-runtime + libquillon.so.1 over the platform stand-ins (/quillon/resources)
+#   nginx-*    nginx (2 workers, keep-alive) serving each answer's bytes and Content-Type
+# Prints requests per second and p99 latency per run, then the mean ratios.
+#
+# Usage: bench/host/run.sh [ROUNDS]      (installs wrk and nginx when missing)
+set -euo pipefail
+rounds=${1:-3}
+duration=${DURATION:-5s}
+root=$(cd "$(dirname "$0")/../.." && pwd)
+build="$root/build/release"
+
+"$root/scripts/install-deps.sh" perf || apt-get install -y -qq --no-install-recommends wrk nginx-light
+cmake --preset release -S "$root" >/dev/null
+cmake --build "$build" -j "$(nproc)" --target ws-runtime quillon ws_runtime_echo_plugin >/dev/null
+
+work=$(mktemp -d /tmp/bench-host-XXXXXX)
+chmod 755 "$work"
+pids=()
+cleanup() {
+  for pid in "${pids[@]}"; do kill "$pid" 2>/dev/null || true; done
+  wait 2>/dev/null || true
+  rm -rf "$work"
+}
+trap cleanup EXIT
+
+free_port() {
+  python3 -c 'import socket; s=socket.socket(); s.bind(("127.0.0.1",0)); print(s.getsockname()[1])'
+}
+
+wait_for() {  # url
+  for _ in $(seq 1 200); do
+    curl -fs -o /dev/null "$1" && return 0
+    sleep 0.05
+  done
+  echo "bench: $1 did not come up" >&2
+  exit 1
+}
+
+start_host() {  # port plugin service
+  "$build/bin/ws-runtime" --listen "127.0.0.1:$1" --plugin "$2" --service "$3" --threads 2 --quiet \
+    2>>"$work/host.log" &
+  pids+=($!)
+  wait_for "http://127.0.0.1:$1/$3/resources"
+}
+
+host_port=$(free_port)
+quillon_port=$(free_port)
+nginx_port=$(free_port)
+start_host "$host_port" "$build/lib/libws_runtime_echo_plugin.so" echo
+start_host "$quillon_port" "$build/lib/libquillon.so.1" quillon
+
+# nginx gets each answer's exact bytes and Content-Type.
+mkdir -p "$work/www" "$work/nginx"
+declare -A types
+for target in immediate quillon; do
+  if [ "$target" = immediate ]; then url="http://127.0.0.1:$host_port/echo/resources";
+  else url="http://127.0.0.1:$quillon_port/quillon/resources"; fi
+  curl -fs -D "$work/$target.head" -o "$work/www/$target" "$url"
+  types[$target]=$(grep -i '^content-type:' "$work/$target.head" | cut -d' ' -f2- | tr -d '\r')
+done
+cat >"$work/nginx/nginx.conf" <<CONF
+worker_processes 2;
+daemon off;
+pid $work/nginx/nginx.pid;
+error_log $work/nginx/error.log;
+events { worker_connections 1024; }
+http {
+  access_log off;
+  keepalive_timeout 65;
+  keepalive_requests 1000000;
+  types { }
+  server {
+    listen 127.0.0.1:$nginx_port;
+    location = /immediate { default_type "${types[immediate]}"; alias $work/www/immediate; }
+    location = /quillon { default_type "${types[quillon]}"; alias $work/www/quillon; }
+  }
+}
+CONF
+nginx -p "$work/nginx" -c "$work/nginx/nginx.conf" &
+pids+=($!)
+wait_for "http://127.0.0.1:$nginx_port/immediate"
+for target in immediate quillon; do
+  curl -fs "http://127.0.0.1:$nginx_port/$target" | cmp -s - "$work/www/$target" ||
+    { echo "bench: nginx does not serve the same bytes for $target" >&2; exit 1; }
+done
+
+# One wrk run: prints "<requests/s> <p99 in ms>".
+measure() {  # url connections
+  wrk -t1 -c"$2" -d"$duration" --latency "$1" | awk '
+    /Requests\/sec/ { rps = $2 }
+    /^ +99%/ { v = $2; if (v ~ /us$/) { sub(/us/, "", v); v /= 1000 }
+               else if (v ~ /ms$/) { sub(/ms/, "", v) } else if (v ~ /s$/) { sub(/s/, "", v); v *= 1000 }
+               p99 = v }
+    END { printf "%.0f %.3f\n", rps, p99 }'
+}
+
+declare -A sum
+printf '%-6s %-14s %5s %12s %10s\n' round target conns 'req/s' 'p99 ms'
+for round in $(seq 1 "$rounds"); do
+  for conns in 16 64; do
+    for target in immediate nginx-immediate quillon nginx-quillon; do
+      case $target in
+        immediate) url="http://127.0.0.1:$host_port/echo/resources" ;;
+        quillon) url="http://127.0.0.1:$quillon_port/quillon/resources" ;;
+        nginx-*) url="http://127.0.0.1:$nginx_port/${target#nginx-}" ;;
+      esac
+      read -r rps p99 < <(measure "$url" "$conns")
+      printf '%-6s %-14s %5s %12s %10s\n' "$round" "$target" "$conns" "$rps" "$p99"
+      sum[$target-$conns]=$(( ${sum[$target-$conns]:-0} + rps ))
+    done
+  done
+done
+echo
+for conns in 16 64; do
+  for target in immediate quillon; do
+    awk -v t="$target" -v c="$conns" -v h="${sum[$target-$conns]}" -v n="${sum[nginx-$target-$conns]}" \
+      'BEGIN { printf "ratio %-9s -c%-3s host/nginx = %.2f\n", t, c, h / n }'
+  done
+done
