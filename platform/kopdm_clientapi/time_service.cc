@@ -213,12 +213,14 @@ int32_t TimeService::getSelectedTrId(char* buffer, uint32_t capacity, koerr::Sta
   const Fault* fault = live.findFault(kCall);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
   const bool selected = live.hasSelectedTr || (fault != nullptr && fault->replacesAnswer);
+  // A warning does not change the answer: the result still says whether a TR
+  // is selected.
   if (!selected) {
-    return fault != nullptr ? reportFault(*status, *fault, {}, {}) : 0;
+    if (fault != nullptr) reportFault(*status, *fault, {}, {});
+    return 0;
   }
-  const int32_t code =
-      serveText({&live.selectedTrId, 0}, fault, {}, {}, buffer, capacity, *status);
-  return code == 0 ? 1 : code;
+  serveText({&live.selectedTrId, 0}, fault, {}, {}, buffer, capacity, *status);
+  return 1;
 }
 
 int32_t TimeService::getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Status* status) {

@@ -163,7 +163,8 @@ TEST_F(AgainstStandIn, SelectedTrIdsUpTo255CharactersArriveWhole) {
     // A cut identifier no longer names its TR, so nothing is published.
     EXPECT_EQ(helpers.getTimescaleUris().size(), length == 255 ? 1u : 0u);
   }
-  install("\"trs\":{}");
+  // A warning while nothing is selected must not pass for a selection.
+  install("\"trs\":{},\"faults\":[{\"call\":\"getSelectedTrId\",\"code\":3}]");
   std::string selected = "unchanged";
   EXPECT_FALSE(wrapper->getSelectedTrId(&selected));
   EXPECT_EQ(selected, "unchanged");

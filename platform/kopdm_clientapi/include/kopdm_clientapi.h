@@ -25,7 +25,8 @@ extern "C" {
 KOPDM_CLIENTAPI_EXPORT int32_t kopdmclientapi_getApiVersion(void);
 
 // 1 and the selected time reference's identifier in `buffer`, or 0 when none
-// is selected (buffer untouched).
+// is selected (buffer untouched), also when the call warns; negative on
+// failure.
 KOPDM_CLIENTAPI_EXPORT int32_t kopdmclientapi_getSelectedTrId(char* buffer, uint32_t capacity,
                                                               koerr::Status* status);
 // The selected time reference's offset in nanoseconds, written to `offsetOut`.
