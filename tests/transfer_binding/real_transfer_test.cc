@@ -70,4 +70,22 @@ TEST(RealTransfer, ExampleClientPrintsTheAnswer) {
   EXPECT_EQ(host.stop(), 0);
 }
 
+#ifdef QUILLON_PLUGIN_PATH
+TEST(RealTransfer, ExampleClientListsThePluginsResources) {
+  HostProcess host({"--quiet"});  // the host's default plug-in is this project's
+  const ClientRun run = runClient(std::to_string(host.port()));
+  EXPECT_EQ(run.exitCode, 0);
+  EXPECT_EQ(run.err, "HTTP 200 vnd.ko.syncDomain.v0/json; charset=utf-8\n");
+  EXPECT_EQ(run.out.rfind("{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"},"
+                          "\"result\":{",
+                          0),
+            0u)
+      << run.out;
+  EXPECT_NE(run.out.find("\"/quillon/syncableDevices/pendulo/timekeeper/genericTk\""),
+            std::string::npos)
+      << run.out;
+  EXPECT_EQ(host.stop(), 0);
+}
+#endif
+
 }  // namespace
