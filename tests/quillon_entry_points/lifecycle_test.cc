@@ -1,37 +1,17 @@
-// Init, Run and Finalize over substitute graph objects, watching the wrapper
+// Init, Run and Finalize over a counting resource manager, watching the wrapper
 // singleton and the services they make and delete.
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <memory>
 #include <stdexcept>
 #include <string>
 
+#include "kopdm_clientapi/api_wrapper.h"
 #include "kosdtools_timescales/timescale_helpers.h"
 #include "quillon/plugin_lifecycle.h"
 #include "ws_runtime/exchange.h"
 
 namespace {
-
-class StubWrapper : public kopendulo::ApiWrapperInterface {
- public:
-  MOCK_METHOD(int32_t, getApiVersion, (), (override));
-  MOCK_METHOD(bool, getSelectedTrId, (std::string*), (override));
-  MOCK_METHOD(int32_t, getSelectedTrOffsetNanos, (int64_t*), (override));
-  MOCK_METHOD(void, getPdmAttrJson, (const std::string&, std::string*), (override));
-  MOCK_METHOD(void, getPdmMetadataJson, (std::string*), (override));
-  MOCK_METHOD(void, getTrAttrJson, (const std::string&, const std::string&, std::string*),
-              (override));
-  MOCK_METHOD(void, getTrMetadataJson, (const std::string&, std::string*), (override));
-  MOCK_METHOD(void, setTrAttr, (const std::string&, const std::string&, const std::string&),
-              (override));
-  MOCK_METHOD(void, restartService, (), (override));
-  MOCK_METHOD(void, bringDownService, (), (override));
-  MOCK_METHOD(void, bringUpService, (), (override));
-  MOCK_METHOD(void, persistConfig, (), (override));
-  MOCK_METHOD(void, updateTrFromConfig, (const std::string&), (override));
-  MOCK_METHOD(int32_t, adjustTime, (int64_t, int64_t), (override));
-};
 
 // Answers the listing with the filter it was given; counts its lifetimes.
 class CountingResourceManager : public quillon::ResourceManagerInterface {
@@ -58,7 +38,7 @@ class LifecycleTest : public ::testing::Test {
     quillon::GraphFactories graph;
     graph.wrapper = [this] {
       ++wrappersMade;
-      return std::make_shared<::testing::StrictMock<StubWrapper>>();
+      return std::make_shared<kopendulo::ApiWrapper>();
     };
     graph.helpers = [](std::shared_ptr<kopendulo::ApiWrapperInterface> wrapper) {
       return std::make_shared<kosdtools::pendulo::TimescaleHelpers>(std::move(wrapper));
