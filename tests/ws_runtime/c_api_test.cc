@@ -1,9 +1,11 @@
 // The C request interface as a plug-in sees it, driven through in-process
 // exchanges.
+#include <atomic>
 #include <cstring>
 #include <memory>
 #include <stdexcept>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -159,6 +161,30 @@ TEST(RequestInfo, LooksUpVariablesFirstDefinitionWinsAndLeavesMissesUntouched) {
   EXPECT_TRUE(info.lookupVariable(U"name", value));
   EXPECT_EQ(value, U"\u00e9t\u00e9");
   EXPECT_EQ(info.command(), U"resources");
+}
+
+}  // namespace
+
+namespace {
+
+TEST(Identifiers, ConcurrentRequestsNeverSeeEachOthersAnswers) {
+  constexpr int kThreads = 4;
+  constexpr int kRequests = 2000;
+  std::atomic<int> crossTalk{0};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < kThreads; ++t) {
+    threads.emplace_back([t, &crossTalk] {
+      const std::string mine = "thread" + std::to_string(t);
+      for (int i = 0; i < kRequests; ++i) {
+        Exchange exchange;
+        WriteOutput_C_REST_KO_GXWS_(exchange.id(), mine.data(), static_cast<uint32_t>(mine.size()));
+        SetHTTPResponseCode_KO_GXWS_(exchange.id(), 200 + t);
+        if (exchange.response().body != mine || exchange.response().code != 200 + t) ++crossTalk;
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(crossTalk.load(), 0);
 }
 
 }  // namespace

@@ -174,8 +174,15 @@ void HttpServer::stop(std::chrono::milliseconds grace) {
 MHD_Result HttpServer::onRequest(void* self, MHD_Connection* connection, const char* url,
                                  const char* method, const char*, const char* uploadData,
                                  size_t* uploadSize, void** requestContext) {
-  return static_cast<HttpServer*>(self)->answer(connection, url, method, uploadData, uploadSize,
-                                                requestContext);
+  // Nothing may unwind into the daemon's C frames: a request that cannot be
+  // handled (out of memory, a plug-in throwing through Run, a full request
+  // table) closes its connection instead.
+  try {
+    return static_cast<HttpServer*>(self)->answer(connection, url, method, uploadData, uploadSize,
+                                                  requestContext);
+  } catch (...) {
+    return MHD_NO;
+  }
 }
 
 void HttpServer::onRequestDone(void* self, MHD_Connection*, void** requestContext,
@@ -240,12 +247,7 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     *uploadSize = 0;
     return MHD_YES;
   }
-  try {
-    return respond(connection, *state, url, method);
-  } catch (const std::exception&) {
-    // Out of memory while mapping the request.
-    return MHD_NO;
-  }
+  return respond(connection, *state, url, method);
 }
 
 MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, const char* url,
