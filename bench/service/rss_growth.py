@@ -40,7 +40,7 @@ def hammer(port, count, failures):
         conn.request("GET", "/quillon/resources")
         response = conn.getresponse()
         body = response.read()
-        if response.status != 200 or not body.startswith(b'{"error":{"code":0'):
+        if response.status != 200 or not body.startswith(b'{"error":{"success":true'):
             failures.append((response.status, body[:120]))
     conn.close()
 
