@@ -1,0 +1,117 @@
+// Many clients at once against one host: every answer must be one that a
+// single client could have received.
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "e2e/service_host.h"
+
+namespace e2e {
+namespace {
+
+namespace test = quillon::test_support;
+
+constexpr int kThreads = 8;
+constexpr int kRequestsPerThread = 2000;
+
+std::string notFoundRecord(int line, const std::string& message, const std::string& members) {
+  return "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/ResourceManager\","
+         "\"line\":" + std::to_string(line) + ",\"component\":\"quillon\",\"kosyncdomain_debug\":{"
+         "\"message\":\"" + message + "\"," + members + "}}";
+}
+
+std::string deviceDocument(const std::string& requirements, bool coherent) {
+  return std::string("{\"uri\":\"") + kDeviceUri + "\",\"coherencyRequirements\":" + requirements +
+         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") +
+         ",\"offsetNanos\":250}";
+}
+
+struct Expected {
+  std::string method;
+  std::string target;
+  std::string body;
+  int status;
+  std::vector<std::string> answers;  // any one of them
+};
+
+TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
+  const std::string ts = "/quillon/timescales/pendulo/";
+  const std::string master = ts + "tr2/00-80-2F-FF-FE-65-43-21";
+  const std::string boundary = ts + "tr0/00-80-2F-FF-FE-12-34-56";
+  ServiceHost host(scenario({{"tr0", "IEEE 1588-2008 BC", "00-80-2F-FF-FE-12-34-56", "PTP_MASTER"},
+                             {"tr2", "IEEE 1588-2008", "00-80-2F-FF-FE-65-43-21", "PTP_MASTER"}}));
+  const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
+  const std::string timescales = "{\"uri\":\"" + boundary + "\"},{\"uri\":\"" + master + "\"}";
+  const std::string explanationText = QUILLON_EXPLANATION_52006;
+  const std::string wrongTs = ts + "tr2/00-80-2f-ff-fe-65-43-21";
+  const std::string wrongDevice = std::string(kDeviceUri) + "/";
+  const std::vector<Expected> mix = {
+      {"GET", "/quillon/resources", "", 200,
+       {successEnvelope("{\"version\":1,\"resources\":[" + device + "," + timescales + "]}")}},
+      {"GET", "/quillon/resources?resourceType=timescales", "", 200,
+       {successEnvelope("{\"version\":1,\"resources\":[" + timescales + "]}")}},
+      {"GET", master, "", 200,
+       {successEnvelope("{\"version\":1,\"uri\":\"" + master +
+                        "\",\"data\":{\"grandmasterId\":\"00:80:2f:ff:fe:65:43:21\"}}")}},
+      {"GET", wrongTs, "", 500,
+       {errorEnvelope(-52006, explanationText,
+                      notFoundRecord(98, "Requested timescaleUri does not match any timescaleUri on the system",
+                                     "\"localTimescaleUri\":\"" + wrongTs + "\",\"currentTimescaleUris\":[\"" +
+                                         boundary + "\",\"" + master + "\"]"))}},
+      {"PUT", kDeviceUri, "{\"maxOffsetNanos\":1000}", 200, {successEnvelope("{}")}},
+      {"GET", kDeviceUri, "", 200,
+       {successEnvelope(deviceDocument("null", true)),
+        successEnvelope(deviceDocument("{\"maxOffsetNanos\":1000}", true)),
+        successEnvelope(deviceDocument("{\"maxOffsetNanos\":100}", false))}},
+      {"PUT", wrongDevice, "{}", 500,
+       {errorEnvelope(-52006, explanationText,
+                      notFoundRecord(127, "Requested syncableDeviceUri does not exist on this host.",
+                                     "\"localDeviceUri\":\"" + wrongDevice + "\",\"onlyDeviceUri\":\"" +
+                                         kDeviceUri + "\""))}},
+      {"PUT", kDeviceUri, "{\"maxOffsetNanos\":100}", 200, {successEnvelope("{}")}},
+      {"GET", "/quillon/unknownCommand", "", 404, {successEnvelope("")}},
+  };
+
+  std::atomic<int> wrong{0};
+  std::mutex firstMutex;
+  std::string first;
+  std::vector<std::thread> clients;
+  for (int t = 0; t < kThreads; ++t) {
+    clients.emplace_back([&, t] {
+      try {
+        test::HttpClient client(host.port());
+        for (int i = 0; i < kRequestsPerThread; ++i) {
+          const Expected& e = mix[(i + t) % mix.size()];
+          test::HttpRequest request;
+          request.method = e.method;
+          request.target = e.target;
+          request.body = e.body;
+          const test::HttpResponse r = client.send(request);
+          bool ok = r.status == e.status;
+          bool matched = false;
+          for (const std::string& answer : e.answers) matched = matched || r.body == answer;
+          if (!ok || !matched) {
+            if (++wrong == 1) {
+              std::lock_guard<std::mutex> lock(firstMutex);
+              first = e.method + " " + e.target + " -> " + std::to_string(r.status) + " " + r.body;
+            }
+          }
+        }
+      } catch (const std::exception& error) {
+        ++wrong;
+        std::lock_guard<std::mutex> lock(firstMutex);
+        first = std::string("client failed: ") + error.what();
+      }
+    });
+  }
+  for (std::thread& c : clients) c.join();
+  EXPECT_EQ(wrong.load(), 0) << first;
+  EXPECT_EQ(host.process().stop(), 0) << host.process().log();
+}
+
+}  // namespace
+}  // namespace e2e

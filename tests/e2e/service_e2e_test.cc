@@ -1,0 +1,233 @@
+// The service over HTTP, as a client sees it: every answer byte for byte.
+#include <cJSON.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <string>
+#include <vector>
+
+#include "e2e/service_host.h"
+
+namespace e2e {
+namespace {
+
+namespace test = quillon::test_support;
+
+const std::string kTs = "/quillon/timescales/pendulo/";
+const std::string kNotFoundText = QUILLON_EXPLANATION_52006;
+
+const std::vector<Tr> kMixed = {
+    {"tr0", "IEEE 1588-2008 BC", "00-80-2F-FF-FE-12-34-56", "PTP_MASTER"},
+    {"tr 1", "IEEE 802.1AS-2011", "00-1B-21-FF-FE-AB-CD-EF", "PTP_SLAVE"},
+    {"tr2", "IEEE 1588-2008", "00-80-2F-FF-FE-65-43-21", "PTP_MASTER"},
+    {"tr3", "IEEE 1588-2008", "00-80-2F-FF-FE-00-00-03", "PTP_SLAVE"},
+    {"tr4", "IEEE 802.1AS-2011", "00-80-2F-FF-FE-00-00-04", "PTP_DISABLED"},
+};
+// Boundary clocks and the selected slave first (the later one first), then
+// masters and disabled ports in order; the unselected slave is not published.
+const std::vector<std::string> kMixedUris = {
+    kTs + "tr-1/00-1B-21-FF-FE-AB-CD-EF", kTs + "tr0/00-80-2F-FF-FE-12-34-56",
+    kTs + "tr2/00-80-2F-FF-FE-65-43-21", kTs + "tr4/00-80-2F-FF-FE-00-00-04"};
+
+std::string entries(const std::vector<std::string>& uris) {
+  std::string out;
+  for (const std::string& uri : uris) out += (out.empty() ? "" : ",") + ("{\"uri\":\"" + uri + "\"}");
+  return out;
+}
+
+std::string deviceDocument(const std::string& requirements, bool coherent) {
+  return std::string("{\"uri\":\"") + kDeviceUri + "\",\"coherencyRequirements\":" + requirements +
+         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") +
+         ",\"offsetNanos\":250}";
+}
+
+void expectAnswer(const test::HttpResponse& r, int status, const std::string& body,
+                  const char* statusCodeHeader = nullptr) {
+  EXPECT_EQ(r.status, status);
+  EXPECT_EQ(r.body, body);
+  EXPECT_EQ(r.header("Content-Type").value_or("<none>"), kMediaType);
+  EXPECT_EQ(r.header("X-Status-Code").value_or("<none>"),
+            statusCodeHeader ? statusCodeHeader : "<none>");
+}
+
+TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
+  ServiceHost host(scenario(kMixed, "tr 1"));
+  const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
+  struct Case {
+    std::string target;
+    std::string result;
+  } cases[] = {
+      {"/quillon/resources",
+       "{\"version\":1,\"resources\":[" + device + "," + entries(kMixedUris) + "]}"},
+      {"/quillon/resources?resourceType=timescales",
+       "{\"version\":1,\"resources\":[" + entries(kMixedUris) + "]}"},
+      {"/quillon/resources?resourceType=syncableDevices",
+       "{\"version\":1,\"resources\":[" + device + "]}"},
+      {"/quillon/resources?resourceType=Timescales", "{\"version\":1,\"resources\":[]}"},
+      {kDeviceUri, deviceDocument("null", true)},
+      {kMixedUris[0],
+       "{\"version\":1,\"uri\":\"" + kMixedUris[0] + "\",\"data\":{\"grandmasterId\":\"00:1b:21:ff:fe:ab:cd:ef\"}}"},
+      {kMixedUris[3],
+       "{\"version\":1,\"uri\":\"" + kMixedUris[3] + "\",\"data\":{\"grandmasterId\":\"00:80:2f:ff:fe:00:00:04\"}}"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.target);
+    expectAnswer(host.get(c.target, {{"Accept", "text/html, */*"}}), 200, successEnvelope(c.result));
+  }
+
+  const std::string list = "[\"" + kMixedUris[0] + "\",\"" + kMixedUris[1] + "\",\"" + kMixedUris[2] +
+                           "\",\"" + kMixedUris[3] + "\"]";
+  for (const std::string& wrong : {kTs + "tr-1/00-1b-21-ff-fe-ab-cd-ef", kMixedUris[1] + "/",
+                                   kTs + "tr3/00-80-2F-FF-FE-00-00-03"}) {
+    SCOPED_TRACE(wrong);
+    const std::string record =
+        "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/ResourceManager\","
+        "\"line\":98,\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"Requested "
+        "timescaleUri does not match any timescaleUri on the system\",\"localTimescaleUri\":\"" +
+        wrong + "\",\"currentTimescaleUris\":" + list + "}}";
+    expectAnswer(host.get(wrong), 500, errorEnvelope(-52006, kNotFoundText, record), "-52006");
+  }
+  const std::string wrongDevice = std::string(kDeviceUri) + "X";
+  expectAnswer(host.get(wrongDevice), 500,
+               errorEnvelope(-52006, kNotFoundText,
+                             "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/"
+                             "ResourceManager\",\"line\":75,\"component\":\"quillon\","
+                             "\"kosyncdomain_debug\":{\"message\":\"Requested syncableDeviceUri does "
+                             "not exist on this host.\",\"localDeviceUri\":\"" + wrongDevice +
+                                 "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"}}"),
+               "-52006");
+  EXPECT_EQ(host.process().stop(), 0);
+}
+
+TEST(ServiceOverHttp, NoTimescalesAndEditsWhileRunning) {
+  ServiceHost host(scenario({}));
+  const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
+  // Both steps back of the listing: the device's comma, and the opening bracket.
+  expectAnswer(host.get("/quillon/resources"), 200,
+               successEnvelope("{\"version\":1,\"resources\":[" + device + "]}"));
+  expectAnswer(host.get("/quillon/resources?resourceType=timescales"), 200,
+               successEnvelope("{\"version\":1,\"resources\":]}"));
+
+  host.writeScenario(scenario({kMixed[2]}));
+  const std::string expected =
+      successEnvelope("{\"version\":1,\"resources\":[" + device + "," + entries({kMixedUris[2]}) + "]}");
+  // The edit must show without restarting the host; the stand-in notices it on
+  // its own, so allow it a bounded number of requests.
+  std::string last;
+  for (int attempt = 0; attempt < 20000 && last != expected; ++attempt) {
+    last = host.get("/quillon/resources").body;
+  }
+  EXPECT_EQ(last, expected);
+  EXPECT_EQ(host.process().stop(), 0);
+}
+
+TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
+  ServiceHost host(scenario({kMixed[0]}));
+  const test::HeaderList vendor = {{"Content-Type", kMediaType}};
+  expectAnswer(host.put(kDeviceUri, "{\"maxOffsetNanos\":1000}", vendor), 200, successEnvelope("{}"));
+  expectAnswer(host.get(kDeviceUri), 200,
+               successEnvelope(deviceDocument("{\"maxOffsetNanos\":1000}", true)));
+  expectAnswer(host.put(kDeviceUri, "{ \"maxOffsetNanos\" : 100 }"), 200, successEnvelope("{}"));
+  expectAnswer(host.get(kDeviceUri), 200,
+               successEnvelope(deviceDocument("{\"maxOffsetNanos\":100}", false)));
+
+  // The device library's own record reaches the client; nothing is stored.
+  for (const char* bad : {"[1]", "maxOffsetNanos=1"}) {
+    SCOPED_TRACE(bad);
+    const test::HttpResponse r = host.put(kDeviceUri, bad, vendor);
+    EXPECT_EQ(r.status, 500);
+    EXPECT_EQ(r.header("X-Status-Code").value_or(""), "-52005");
+    cJSON* envelope = cJSON_Parse(r.body.c_str());
+    const cJSON* error = cJSON_GetObjectItemCaseSensitive(envelope, "error");
+    const cJSON* info = cJSON_GetObjectItemCaseSensitive(error, "errorInfo");
+    ASSERT_TRUE(cJSON_IsString(info)) << r.body;
+    cJSON* record = cJSON_Parse(info->valuestring);
+    EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(record, "error_constant")->valuestring,
+                 "koapalerr_invalidParameter");
+    EXPECT_NE(cJSON_GetObjectItemCaseSensitive(record, "kosdlib_debug"), nullptr) << info->valuestring;
+    EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(envelope, "result"), nullptr);
+    cJSON_Delete(record);
+    cJSON_Delete(envelope);
+  }
+  const std::string wrong = std::string(kDeviceUri).substr(0, 40);
+  expectAnswer(host.put(wrong + "/x/y", "{}"), 500,
+               errorEnvelope(-52006, kNotFoundText,
+                             "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/"
+                             "ResourceManager\",\"line\":127,\"component\":\"quillon\","
+                             "\"kosyncdomain_debug\":{\"message\":\"Requested syncableDeviceUri does "
+                             "not exist on this host.\",\"localDeviceUri\":\"" + wrong + "/x/y" +
+                                 "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"}}"),
+               "-52006");
+  expectAnswer(host.get(kDeviceUri), 200,
+               successEnvelope(deviceDocument("{\"maxOffsetNanos\":100}", false)));
+  EXPECT_EQ(host.process().stop(), 0);
+}
+
+// What a failing time service makes of a listing: the helpers' record, with
+// the service's own nested inside where it was replaced.
+TEST(ServiceOverHttp, TimeServiceErrorsReachTheClientAsTheirEnvelope) {
+  const std::string trs = scenario({kMixed[0], kMixed[2]});
+  const std::string body = trs.substr(0, trs.size() - 1);
+  struct Case {
+    std::string scenarioText;
+    int32_t code;
+    std::string constant;
+    int line;
+    std::string message;
+    int32_t nestedCode;  // 0: none
+  } cases[] = {
+      {body + ",\"faults\":[{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"code\":-1074100990}]}",
+       -52006, "koapalerr_resourceNotFound", 182,
+       "Pendulo does not have the specified attr; maybe the target is running an older version of Pendulo.",
+       -1074100990},
+      {body + ",\"faults\":[{\"call\":\"getTrAttrJson\",\"trId\":\"tr2\",\"key\":\"type\",\"code\":-1074100991}]}",
+       -52006, "koapalerr_resourceNotFound", 221, "The specified Pendulo Time Reference does not exist.",
+       -1074100991},
+      {body + ",\"faults\":[{\"call\":\"getTrAttrJson\",\"trId\":\"tr0\",\"key\":\"gmClockId\",\"code\":-1074100990}]}",
+       -52006, "koapalerr_resourceNotFound", 87,
+       "The specified Pendulo Time Reference has not set a Grandmaster ID.", -1074100990},
+      {body + ",\"faults\":[{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"answer\":\"not json\"}]}",
+       -52005, "koapalerr_invalidParameter", 193, "Failed to parse TR IDs from TR list JSON.", 0},
+      {body + ",\"faults\":[{\"call\":\"getTrAttrJson\",\"trId\":\"tr2\",\"key\":\"portState\",\"answer\":\"{\\\"portState\\\":null}\"}]}",
+       -52006, "koapalerr_resourceNotFound", 287,
+       "The specified Pendulo Time Reference's Port State is null.", 0},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.message);
+    ServiceHost host(c.scenarioText);
+    for (const std::string& target : {std::string("/quillon/resources"), kMixedUris[1]}) {
+      SCOPED_TRACE(target);
+      const test::HttpResponse r = host.get(target);
+      EXPECT_EQ(r.status, 500);
+      EXPECT_EQ(r.header("X-Status-Code").value_or(""), std::to_string(c.code));
+      cJSON* envelope = cJSON_Parse(r.body.c_str());
+      const cJSON* error = cJSON_GetObjectItemCaseSensitive(envelope, "error");
+      ASSERT_NE(error, nullptr) << r.body;
+      EXPECT_TRUE(cJSON_IsFalse(cJSON_GetObjectItemCaseSensitive(error, "success")));
+      EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(error, "errorCode")->valueint, c.code);
+      cJSON* record = cJSON_Parse(cJSON_GetObjectItemCaseSensitive(error, "errorInfo")->valuestring);
+      ASSERT_NE(record, nullptr) << r.body;
+      EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(record, "error_constant")->valuestring,
+                   c.constant.c_str());
+      EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(record, "file")->valuestring,
+                   "kosdtools_timescales/timescaleHelpers");
+      EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(record, "line")->valueint, c.line);
+      const cJSON* debug = cJSON_GetObjectItemCaseSensitive(record, "kosyncdomain_debug");
+      EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(debug, "message")->valuestring, c.message.c_str());
+      const cJSON* nested = cJSON_GetObjectItemCaseSensitive(record, "nested_error");
+      if (c.nestedCode == 0) {
+        EXPECT_EQ(nested, nullptr);
+      } else {
+        ASSERT_EQ(cJSON_GetArraySize(nested), 1);
+        EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(cJSON_GetArrayItem(nested, 0), "code")->valueint,
+                  c.nestedCode);
+      }
+      cJSON_Delete(record);
+      cJSON_Delete(envelope);
+    }
+    EXPECT_EQ(host.process().stop(), 0);
+  }
+}
+
+}  // namespace
+}  // namespace e2e

@@ -1,0 +1,100 @@
+#include "e2e/service_host.h"
+
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <fstream>
+#include <stdexcept>
+
+namespace e2e {
+
+namespace test = quillon::test_support;
+
+std::string jsonString(const std::string& text) {
+  std::string out = "\"";
+  for (char c : text) {
+    if (c == '"' || c == '\\') out += '\\';
+    out += c;
+  }
+  return out + "\"";
+}
+
+std::string scenario(const std::vector<Tr>& trs, const std::string& selected,
+                     const std::string& extra) {
+  std::string out = "{\"apiVersion\":1,\"selectedTrId\":";
+  out += selected.empty() ? "null" : jsonString(selected);
+  out += ",\"trs\":{";
+  for (std::size_t i = 0; i < trs.size(); ++i) {
+    if (i) out += ',';
+    out += jsonString(trs[i].id) + ":{\"attrs\":{\"type\":" + jsonString(trs[i].type) +
+           ",\"gmClockId\":" + jsonString(trs[i].gmClockId) +
+           ",\"portState\":" + jsonString(trs[i].portState) + "}}";
+  }
+  out += "}";
+  if (!extra.empty()) out += "," + extra;
+  return out + "}";
+}
+
+namespace {
+
+void writeFile(const std::string& path, const std::string& text) {
+  std::ofstream file(path, std::ios::binary | std::ios::trunc);
+  file << text;
+  if (!file.flush()) throw std::runtime_error("cannot write " + path);
+}
+
+}  // namespace
+
+ServiceHost::ServiceHost(const std::string& scenarioText, const std::vector<std::string>& extraArgs) {
+  char dir[] = "/tmp/quillon-e2e-XXXXXX";
+  if (mkdtemp(dir) == nullptr) throw std::runtime_error("mkdtemp failed");
+  directory_ = dir;
+  scenarioPath_ = directory_ + "/scenario.json";
+  writeFile(scenarioPath_, scenarioText);
+  const std::string marker = directory_ + "/share.dir";
+  writeFile(marker, QUILLON_SHARE_DIR);
+  std::vector<std::string> args = {"--plugin", test::kQuillonPluginPath, "--quiet"};
+  args.insert(args.end(), extraArgs.begin(), extraArgs.end());
+  host_ = std::make_unique<test::HostProcess>(
+      args, test::Environment{{"KOPDM_SIM_SCENARIO", scenarioPath_},
+                              {"KOSYSQ_SHARE_DIR_FILE", marker}});
+}
+
+ServiceHost::~ServiceHost() {
+  host_.reset();
+  std::remove(scenarioPath_.c_str());
+  std::remove((directory_ + "/share.dir").c_str());
+  std::remove((directory_ + "/next.json").c_str());
+  rmdir(directory_.c_str());
+}
+
+void ServiceHost::writeScenario(const std::string& text) {
+  const std::string next = directory_ + "/next.json";
+  writeFile(next, text);
+  if (std::rename(next.c_str(), scenarioPath_.c_str()) != 0) {
+    throw std::runtime_error("cannot replace " + scenarioPath_);
+  }
+}
+
+test::HttpResponse ServiceHost::get(const std::string& target, const test::HeaderList& headers) {
+  return test::httpRequest(port(), "GET", target, headers);
+}
+
+test::HttpResponse ServiceHost::put(const std::string& target, const std::string& body,
+                                    const test::HeaderList& headers) {
+  return test::httpRequest(port(), "PUT", target, headers, body);
+}
+
+std::string successEnvelope(const std::string& result) {
+  std::string out = "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"}";
+  if (!result.empty()) out += ",\"result\":" + result;
+  return out + "}";
+}
+
+std::string errorEnvelope(int32_t code, const std::string& explanation, const std::string& record) {
+  return "{\"error\":{\"success\":false,\"errorCode\":" + std::to_string(code) +
+         ",\"errorText\":" + jsonString(explanation) + ",\"errorInfo\":" + jsonString(record) + "}}";
+}
+
+}  // namespace e2e
