@@ -46,7 +46,7 @@ TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
                              {"tr2", "IEEE 1588-2008", "00-80-2F-FF-FE-65-43-21", "PTP_MASTER"}}));
   const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
   const std::string timescales = "{\"uri\":\"" + boundary + "\"},{\"uri\":\"" + master + "\"}";
-  const std::string explanationText = QUILLON_EXPLANATION_52006;
+  const std::string explanationText = shippedExplanation(-52006);
   const std::string wrongTs = ts + "tr2/00-80-2f-ff-fe-65-43-21";
   const std::string wrongDevice = std::string(kDeviceUri) + "/";
   const std::vector<Expected> mix = {

@@ -14,7 +14,6 @@ namespace {
 namespace test = quillon::test_support;
 
 const std::string kTs = "/quillon/timescales/pendulo/";
-const std::string kNotFoundText = QUILLON_EXPLANATION_52006;
 
 const std::vector<Tr> kMixed = {
     {"tr0", "IEEE 1588-2008 BC", "00-80-2F-FF-FE-12-34-56", "PTP_MASTER"},
@@ -85,11 +84,11 @@ TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
         "\"line\":98,\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"Requested "
         "timescaleUri does not match any timescaleUri on the system\",\"localTimescaleUri\":\"" +
         wrong + "\",\"currentTimescaleUris\":" + list + "}}";
-    expectAnswer(host.get(wrong), 500, errorEnvelope(-52006, kNotFoundText, record), "-52006");
+    expectAnswer(host.get(wrong), 500, errorEnvelope(-52006, shippedExplanation(-52006), record), "-52006");
   }
   const std::string wrongDevice = std::string(kDeviceUri) + "X";
   expectAnswer(host.get(wrongDevice), 500,
-               errorEnvelope(-52006, kNotFoundText,
+               errorEnvelope(-52006, shippedExplanation(-52006),
                              "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/"
                              "ResourceManager\",\"line\":75,\"component\":\"quillon\","
                              "\"kosyncdomain_debug\":{\"message\":\"Requested syncableDeviceUri does "
@@ -151,7 +150,7 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
   }
   const std::string wrong = std::string(kDeviceUri).substr(0, 40);
   expectAnswer(host.put(wrong + "/x/y", "{}"), 500,
-               errorEnvelope(-52006, kNotFoundText,
+               errorEnvelope(-52006, shippedExplanation(-52006),
                              "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/"
                              "ResourceManager\",\"line\":127,\"component\":\"quillon\","
                              "\"kosyncdomain_debug\":{\"message\":\"Requested syncableDeviceUri does "

@@ -5,6 +5,7 @@
 
 #include <cstdio>
 #include <fstream>
+#include <iterator>
 #include <stdexcept>
 
 namespace e2e {
@@ -95,6 +96,17 @@ std::string successEnvelope(const std::string& result) {
 std::string errorEnvelope(int32_t code, const std::string& explanation, const std::string& record) {
   return "{\"error\":{\"success\":false,\"errorCode\":" + std::to_string(code) +
          ",\"errorText\":" + jsonString(explanation) + ",\"errorInfo\":" + jsonString(record) + "}}";
+}
+
+std::string shippedExplanation(int32_t code) {
+  std::ifstream file(std::string(QUILLON_SHARE_DIR) + "/errors/English/quillon.txt", std::ios::binary);
+  const std::string text((std::istreambuf_iterator<char>(file)), std::istreambuf_iterator<char>());
+  const std::string start = "\n<koerror code=\"" + std::to_string(code) + "\">\n";
+  const std::size_t begin = text.find(start);
+  if (begin == std::string::npos) throw std::runtime_error("no shipped explanation of " + std::to_string(code));
+  const std::size_t from = begin + start.size();
+  const std::size_t end = text.find("\n</koerror>", from - 1);
+  return text.substr(from, end + 1 - from);
 }
 
 }  // namespace e2e

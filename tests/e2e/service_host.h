@@ -62,6 +62,9 @@ std::string successEnvelope(const std::string& result);
 std::string errorEnvelope(int32_t code, const std::string& explanation, const std::string& record);
 // The text as a JSON string, quotes included.
 std::string jsonString(const std::string& text);
+// The explanation of `code` in the shipped English explanations file: the
+// lines between the entry's tags, line ends included.
+std::string shippedExplanation(int32_t code);
 
 }  // namespace e2e
 
