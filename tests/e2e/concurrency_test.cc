@@ -48,7 +48,7 @@ TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
   const std::string timescales = "{\"uri\":\"" + boundary + "\"},{\"uri\":\"" + master + "\"}";
   const std::string explanationText = shippedExplanation(-52006);
   const std::string wrongTs = ts + "tr2/00-80-2f-ff-fe-65-43-21";
-  const std::string wrongDevice = std::string(kDeviceUri) + "/";
+  const std::string wrongDevice = std::string(kDeviceUri) + "X";
   const std::vector<Expected> mix = {
       {"GET", "/quillon/resources", "", 200,
        {successEnvelope("{\"version\":1,\"resources\":[" + device + "," + timescales + "]}")}},

@@ -76,7 +76,7 @@ TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
 
   const std::string list = "[\"" + kMixedUris[0] + "\",\"" + kMixedUris[1] + "\",\"" + kMixedUris[2] +
                            "\",\"" + kMixedUris[3] + "\"]";
-  for (const std::string& wrong : {kTs + "tr-1/00-1b-21-ff-fe-ab-cd-ef", kMixedUris[1] + "/",
+  for (const std::string& wrong : {kTs + "tr-1/00-1b-21-ff-fe-ab-cd-ef", kMixedUris[1].substr(0, kMixedUris[1].size() - 1),
                                    kTs + "tr3/00-80-2F-FF-FE-00-00-03"}) {
     SCOPED_TRACE(wrong);
     const std::string record =
@@ -148,13 +148,13 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
     cJSON_Delete(record);
     cJSON_Delete(envelope);
   }
-  const std::string wrong = std::string(kDeviceUri).substr(0, 40);
-  expectAnswer(host.put(wrong + "/x/y", "{}"), 500,
+  const std::string wrong = "/quillon/syncableDevices/pendulo/timekeeper/generictk";
+  expectAnswer(host.put(wrong, "{}"), 500,
                errorEnvelope(-52006, shippedExplanation(-52006),
                              "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/"
                              "ResourceManager\",\"line\":127,\"component\":\"quillon\","
                              "\"kosyncdomain_debug\":{\"message\":\"Requested syncableDeviceUri does "
-                             "not exist on this host.\",\"localDeviceUri\":\"" + wrong + "/x/y" +
+                             "not exist on this host.\",\"localDeviceUri\":\"" + wrong +
                                  "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"}}"),
                "-52006");
   expectAnswer(host.get(kDeviceUri), 200,

@@ -106,7 +106,12 @@ std::string shippedExplanation(int32_t code) {
   if (begin == std::string::npos) throw std::runtime_error("no shipped explanation of " + std::to_string(code));
   const std::size_t from = begin + start.size();
   const std::size_t end = text.find("\n</koerror>", from - 1);
-  return text.substr(from, end + 1 - from);
+  std::string explanation = text.substr(from, end + 1 - from);
+  // The service drops the entry's trailing line ends.
+  while (!explanation.empty() && (explanation.back() == '\n' || explanation.back() == '\r')) {
+    explanation.pop_back();
+  }
+  return explanation;
 }
 
 }  // namespace e2e
