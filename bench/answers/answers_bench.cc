@@ -30,7 +30,8 @@ const char* kDevice =
 class Share {
  public:
   Share() {
-    std::string pattern = (std::filesystem::temp_directory_path() / "answers-bench-XXXXXX").string();
+    std::string pattern =
+        (std::filesystem::temp_directory_path() / "answers-bench-XXXXXX").string();
     if (mkdtemp(pattern.data()) == nullptr) {
       std::perror("mkdtemp");
       std::abort();

@@ -21,7 +21,10 @@ void reportFailure(koerr::Status* status, int line, const char* debug, const cha
     return;
   }
   koerr::Report report(*status, koerr::koapalerr_invalidParameter, kFile, line);
-  report.open("kodynlib_debug").add("debug", debug).add(subjectKey, subject != nullptr ? subject : "").close();
+  report.open("kodynlib_debug")
+      .add("debug", debug)
+      .add(subjectKey, subject != nullptr ? subject : "")
+      .close();
   report.open("internal_error").add("api", "dlerror");
   // The loader may have nothing to say (a null handle to dlsym, say); an
   // absent member tells that more honestly than an empty text.

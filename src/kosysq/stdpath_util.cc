@@ -30,8 +30,15 @@ void reportFileFailure(koerr::Status& status, const koerr::ErrorConstant& consta
   // The GNU variant may return a static text instead of filling ours.
   const char* systemText = strerror_r(error, text, sizeof text);
   koerr::Report(status, constant, kFile, line)
-      .open("internal_error").add("api", "errno").addInt("code", error).add("string", systemText).close()
-      .open("kosysq_debug").add("message", message).add("path", path).close();
+      .open("internal_error")
+      .add("api", "errno")
+      .addInt("code", error)
+      .add("string", systemText)
+      .close()
+      .open("kosysq_debug")
+      .add("message", message)
+      .add("path", path)
+      .close();
 }
 
 // Size by seeking to the end; a directory opens fine for reading on Linux but

@@ -22,14 +22,20 @@ void addErrnoDetails(koerr::Report& report, int error) {
   char text[256] = "";
   // The GNU variant may return a static text instead of filling ours.
   const char* systemText = strerror_r(error, text, sizeof text);
-  report.open("internal_error").add("api", "errno").addInt("code", error).add("string", systemText).close();
+  report.open("internal_error")
+      .add("api", "errno")
+      .addInt("code", error)
+      .add("string", systemText)
+      .close();
 }
 
 std::unique_ptr<Directory> Directory::open(const std::string& path, koerr::Status& status) {
   std::unique_ptr<Directory> directory(new (std::nothrow) Directory());
   if (!directory) {
     koerr::Report(status, koerr::koapalerr_memoryFull, kFile, kMemoryLine)
-        .open("koxlator_debug").add("koxlator", "failed to allocate memory").close();
+        .open("koxlator_debug")
+        .add("koxlator", "failed to allocate memory")
+        .close();
     return nullptr;
   }
   int error = ENAMETOOLONG;

@@ -18,7 +18,8 @@ namespace {
 
 constexpr const char* kFile = "koxlator/gxErrorsParser";
 
-constexpr const char* kLanguages[] = {"English", "French", "German", "Japanese", "Korean", "ChineseS"};
+constexpr const char* kLanguages[] = {"English",  "French", "German",
+                                      "Japanese", "Korean", "ChineseS"};
 constexpr uint32_t kLanguageCount = sizeof kLanguages / sizeof kLanguages[0];
 
 // A tag counts only at the very start of a line, compared without regard to
@@ -49,7 +50,9 @@ enum class Outcome { kNoMatch, kMatched, kFailed };
 
 void reportMalformed(koerr::Status& status, int line, const char* debug) {
   koerr::Report(status, koerr::koapalerr_resourceNotFound, kFile, line)
-      .open("koxlator_debug").add("debug", debug).close();
+      .open("koxlator_debug")
+      .add("debug", debug)
+      .close();
 }
 
 void reportMemoryFull(koerr::Status& status) {
@@ -150,7 +153,10 @@ void reportFileInfoFailure(koerr::Status& status, int error, const std::string& 
 std::string languageName(uint32_t language, koerr::Status& status) {
   if (language >= kLanguageCount) {
     koerr::Report(status, koerr::koapalerr_invalidParameter, kFile, 43)
-        .open("koxlator_debug").add("gxerrorsparser", "invalid language").addUInt("lang", language).close();
+        .open("koxlator_debug")
+        .add("gxerrorsparser", "invalid language")
+        .addUInt("lang", language)
+        .close();
     return std::string();
   }
   return kLanguages[language];

@@ -100,7 +100,9 @@ std::unique_ptr<RequestInterface> Service::handleRequest(std::unique_ptr<Request
   }
   if (!request) {
     koerr::Report(status, koerr::kInternalSoftwareError, kFile, 117)
-        .open("quillon_debug").add("check failed", "request != nullptr").close();
+        .open("quillon_debug")
+        .add("check failed", "request != nullptr")
+        .close();
     return nullptr;
   }
   LocalStatus local;

@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <optional>
@@ -31,6 +32,12 @@ inline ::testing::AssertionResult parses(const std::string& text) {
   const bool ok = root != nullptr;
   cJSON_Delete(root);
   return ok ? ::testing::AssertionSuccess() : ::testing::AssertionFailure() << "not JSON: " << text;
+}
+
+// The "internal_error" member that failed system calls add to a record.
+inline std::string errnoMember(int error) {
+  return "\"internal_error\":{\"api\":\"errno\",\"code\":" + std::to_string(error) +
+         ",\"string\":\"" + std::strerror(error) + "\"}";
 }
 
 // A fresh directory under the system's temporary directory, removed with

@@ -25,7 +25,7 @@ std::string recordWithoutLoaderText(const std::string& record, const std::string
 
 TEST(DynloadTest, FailedLoadIsRecordedOnceAndLaterCallsDoNothing) {
   dlopen("libearlier-failure.so.1", RTLD_NOW);  // leaves a loader text unread
-  OwnedStatus status(3);  // a warning still gives way to the error
+  OwnedStatus status(3);                        // a warning still gives way to the error
   EXPECT_EQ(kodynlib_load("libnot-installed.so.7", RTLD_NOW, &status), nullptr);
   EXPECT_EQ(status.code, -52005);
   ASSERT_TRUE(parses(status.text()));

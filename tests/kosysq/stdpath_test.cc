@@ -27,7 +27,8 @@ class StandardDirectoriesTest : public ::testing::Test {
   void SetUp() override {
     void* standIn = dlopen(kosysq::kRelocationLibrary, RTLD_NOW);
     ASSERT_NE(standIn, nullptr) << "the relocation stand-in must be on LD_LIBRARY_PATH "
-                                   "(run through ctest): " << dlerror();
+                                   "(run through ctest): "
+                                << dlerror();
     dlclose(standIn);
   }
 };
@@ -41,7 +42,8 @@ TEST_F(StandardDirectoriesTest, RelocatesThroughTheLibraryUntilAnAnswerFails) {
     int32_t code;
   };
   const Case cases[] = {
-      {"library answers 0 throughout", kosysq::kRelocationLibrary, std::nullopt, defaultsWith({}), 0},
+      {"library answers 0 throughout", kosysq::kRelocationLibrary, std::nullopt, defaultsWith({}),
+       0},
       {"two relocated", kosysq::kRelocationLibrary,
        std::string("bindir=/opt/k/bin;initddir=/opt/k/init.d"),
        defaultsWith({{"bindir", "/opt/k/bin"}, {"initddir", "/opt/k/init.d"}}), 0},

@@ -10,6 +10,7 @@
 
 namespace {
 
+using answers_test::errnoMember;
 using answers_test::OwnedStatus;
 using answers_test::parses;
 using answers_test::ScopedEnv;
@@ -29,23 +30,28 @@ std::string lookupIn(const std::string& file, int32_t code, OwnedStatus& status)
 
 TEST(ErrorsParserTest, FindsEntriesWhateverTheirSpelling) {
   ScratchDir dir;
-  const std::string lf = dir.write(
-      "lf.txt",
-      "<?XML VERSION=\"1.0\" encoding=\"UTF-8\"?>\n<KODOCUMENT>\n"
-      "<kocomment>\n" + entry("7", "inside a comment\n") + "</kocomment> closes here\n"
-      "<KOERROR CODE=\"-52005\">\nInvalid parameter.\n</KoError>\n" +
-      entry("0x10", "Sixteen,\non two lines.\n\n") +
-      "  <koerror code=\"5\">\nindented, so never an entry\n</koerror>\n"
-      "free text between entries\n"
-      "<koerror code=\"12\">text on the tag line\nbody\n</koerror> and after it\n" +
-      entry("010", "octal eight\n") +
-      // A 1023-byte piece fills the line buffer; the rest of that line then
-      // arrives as a line of its own, which here ends the entry.
-      "<koerror code=\"13\">\n" + std::string(1023, 'x') + "</koerror>\n"
-      "</kodocument>\n" + entry("99", "after the end\n"));
-  const std::string crlf = dir.write(
-      "crlf.txt", "<?xml version=\"1.0\"?>\r\n<kodocument>\r\n<koerror code=\"1\">\r\n"
-                  "line one\r\nline two\r\n\r\n</koerror>\r\n</kodocument>\r\n");
+  const std::string lf =
+      dir.write("lf.txt",
+                "<?XML VERSION=\"1.0\" encoding=\"UTF-8\"?>\n<KODOCUMENT>\n"
+                "<kocomment>\n" +
+                    entry("7", "inside a comment\n") +
+                    "</kocomment> closes here\n"
+                    "<KOERROR CODE=\"-52005\">\nInvalid parameter.\n</KoError>\n" +
+                    entry("0x10", "Sixteen,\non two lines.\n\n") +
+                    "  <koerror code=\"5\">\nindented, so never an entry\n</koerror>\n"
+                    "free text between entries\n"
+                    "<koerror code=\"12\">text on the tag line\nbody\n</koerror> and after it\n" +
+                    entry("010", "octal eight\n") +
+                    // A 1023-byte piece fills the line buffer; the rest of that line then
+                    // arrives as a line of its own, which here ends the entry.
+                    "<koerror code=\"13\">\n" + std::string(1023, 'x') +
+                    "</koerror>\n"
+                    "</kodocument>\n" +
+                    entry("99", "after the end\n"));
+  const std::string crlf =
+      dir.write("crlf.txt",
+                "<?xml version=\"1.0\"?>\r\n<kodocument>\r\n<koerror code=\"1\">\r\n"
+                "line one\r\nline two\r\n\r\n</koerror>\r\n</kodocument>\r\n");
   struct Case {
     const std::string* file;
     int32_t code;
@@ -74,9 +80,10 @@ TEST(ErrorsParserTest, FindsEntriesWhateverTheirSpelling) {
 TEST(ErrorsParserTest, FilesOfAnotherKindAreSkippedQuietly) {
   ScratchDir dir;
   const std::string body = entry("1", "one\n") + "</kodocument>\n";
-  const std::string contents[] = {
-      "", "<?xml version=\"1.0\"?>\n", "<?xml version=\"1.1\"?>\n<kodocument>\n" + body,
-      "<?xml version=\"1.0\"?>\n<document>\n" + body, "<?xml version=\"1.0\"?>\n <kodocument>\n" + body};
+  const std::string contents[] = {"", "<?xml version=\"1.0\"?>\n",
+                                  "<?xml version=\"1.1\"?>\n<kodocument>\n" + body,
+                                  "<?xml version=\"1.0\"?>\n<document>\n" + body,
+                                  "<?xml version=\"1.0\"?>\n <kodocument>\n" + body};
   int index = 0;
   for (const std::string& content : contents) {
     SCOPED_TRACE(content);
@@ -97,12 +104,16 @@ TEST(ErrorsParserTest, MalformedFilesAreReportedExactly) {
   };
   const Case cases[] = {
       {"missing", "",
-       prefix + "\"line\":148,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
-                "\"Could not open status explanations file\",\"path\":\"" + dir.str() + "/missing\"}}"},
+       prefix +
+           "\"line\":148,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
+           "\"Could not open status explanations file\",\"path\":\"" +
+           dir.str() + "/missing\"}}"},
       {"no end tag", kHead + "<koerror code=\"1\">\none\n",
-       prefix + "\"line\":208,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
-                "\"Bad explanation file. Could not find the end of the status code definition !\"}}"},
-      {"NUL line", kHead + entry("2", "two\n") + std::string("\0heading\n", 9) + entry("1", "one\n"),
+       prefix +
+           "\"line\":208,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
+           "\"Bad explanation file. Could not find the end of the status code definition !\"}}"},
+      {"NUL line",
+       kHead + entry("2", "two\n") + std::string("\0heading\n", 9) + entry("1", "one\n"),
        prefix + "\"line\":229,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
                 "\"Bad explanation file. Unidentified section heading !\"}}"},
       {"unreadable code", kHead + entry("one", "one\n"),
@@ -142,7 +153,8 @@ TEST(ErrorsParserTest, SearchesLanguageDirectoryThenItsParent) {
   dir.write("errors/English/b.err", kHead + entry("1", "first b\n") + entry("4", "four\n"));
   dir.write("errors/English/c.md", kHead + entry("5", "not an explanation file\n"));
   dir.write("errors/English/sub.txt/d.txt", kHead + entry("6", "in a subdirectory\n"));
-  dir.write("errors/parent.txt", kHead + entry("2", "from the parent\n") + entry("3", "shadowed\n"));
+  dir.write("errors/parent.txt",
+            kHead + entry("2", "from the parent\n") + entry("3", "shadowed\n"));
   const std::string winner = firstListed(errors + "/English", "a.txt", "b.err");
 
   ScopedEnv marker("KOSYSQ_SHARE_DIR_FILE", dir.write("share.dir", dir.str() + "/\n"));
@@ -155,8 +167,12 @@ TEST(ErrorsParserTest, SearchesLanguageDirectoryThenItsParent) {
     int32_t code;
     std::string expected;
   };
-  const Case cases[] = {{1, winner == "a.txt" ? "first a" : "first b"}, {2, "from the parent"},
-                        {3, "three"}, {4, "four"}, {5, ""}, {6, ""}};
+  const Case cases[] = {{1, winner == "a.txt" ? "first a" : "first b"},
+                        {2, "from the parent"},
+                        {3, "three"},
+                        {4, "four"},
+                        {5, ""},
+                        {6, ""}};
   for (const Case& c : cases) {
     SCOPED_TRACE(c.code);
     OwnedStatus status;
@@ -173,18 +189,22 @@ TEST(ErrorsParserTest, DirectoryFailuresStopTheLookup) {
   const std::string errors = dir.str() + "/errors";
   const std::string noEnglish =
       "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"koxlator/koxlator_internal\","
-      "\"line\":63,\"component\":\"quillon\",\"internal_error\":{\"api\":\"errno\",\"code\":2,"
-      "\"string\":\"" + std::string(std::strerror(ENOENT)) + "\"},\"koxlator_debug\":{\"debug\":"
-      "\"open dir failed\",\"path\":\"" + errors + "/English\"}}";
+      "\"line\":63,\"component\":\"quillon\"," +
+      errnoMember(ENOENT) +
+      ",\"koxlator_debug\":{\"debug\":"
+      "\"open dir failed\",\"path\":\"" +
+      errors + "/English\"}}";
   const std::string badLanguage =
       "{\"error_constant\":\"koapalerr_invalidParameter\",\"file\":\"koxlator/gxErrorsParser\","
       "\"line\":43,\"component\":\"quillon\",\"koxlator_debug\":{\"gxerrorsparser\":"
       "\"invalid language\",\"lang\":6}}";
   const std::string dangling =
       "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"koxlator/gxErrorsParser\","
-      "\"line\":96,\"component\":\"quillon\",\"internal_error\":{\"api\":\"errno\",\"code\":2,"
-      "\"string\":\"" + std::string(std::strerror(ENOENT)) + "\"},\"koxlator_debug\":{\"koxlator\":"
-      "\"get file info failed\",\"path\":\"" + errors + "/English/gone.txt\"}}";
+      "\"line\":96,\"component\":\"quillon\"," +
+      errnoMember(ENOENT) +
+      ",\"koxlator_debug\":{\"koxlator\":"
+      "\"get file info failed\",\"path\":\"" +
+      errors + "/English/gone.txt\"}}";
   struct Case {
     const char* name;
     uint32_t language;
@@ -212,13 +232,14 @@ TEST(ErrorsParserTest, DirectoryFailuresStopTheLookup) {
 }
 
 TEST(ErrorsParserTest, ShippedFileExplainsEveryCodeTheServiceReports) {
-  const int32_t codes[] = {-411200, -411145, -411203, -52000, -52004, -52005,
-                           -52006,  -52008,  -1074100990, -1074100991};
+  const int32_t codes[] = {-411200, -411145, -411203, -52000,      -52004,
+                           -52005,  -52006,  -52008,  -1074100990, -1074100991};
   for (int32_t code : codes) {
     SCOPED_TRACE(code);
     OwnedStatus status;
     std::string text;
-    koxlator::lookupExplanation(QUILLON_SHARE_DIR "/errors", code, koxlator::kEnglish, text, status);
+    koxlator::lookupExplanation(QUILLON_SHARE_DIR "/errors", code, koxlator::kEnglish, text,
+                                status);
     EXPECT_EQ(status.code, 0);
     EXPECT_GT(text.size(), 20u);
     EXPECT_EQ(text.find('\n'), std::string::npos) << "one paragraph per code";

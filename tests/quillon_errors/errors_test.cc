@@ -31,7 +31,9 @@ class EnvelopeTest : public ::testing::Test {
 TEST_F(EnvelopeTest, CarriesCodeExplanationRecordAndResult) {
   OwnedStatus notFound;
   koerr::Report(notFound, koerr::koapalerr_resourceNotFound, "quillon/ResourceManager", 75)
-      .open("kosyncdomain_debug").add("uri", "/a\"b").close();
+      .open("kosyncdomain_debug")
+      .add("uri", "/a\"b")
+      .close();
   OwnedStatus warning(4);
   OwnedStatus unexplained;
   koerr::Report(unexplained, koerr::kCommandNotFound, "quillon/Service", 260);
@@ -45,7 +47,8 @@ TEST_F(EnvelopeTest, CarriesCodeExplanationRecordAndResult) {
   };
   const OwnedStatus success;
   const Case cases[] = {
-      {"success, no result", success, "", "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"}}"},
+      {"success, no result", success, "",
+       "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"}}"},
       {"success with result", success, "{\"a\":[1]}",
        "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"},\"result\":{\"a\":[1]}}"},
       {"long result", success, big,
@@ -91,17 +94,21 @@ void translate(koerr::Status& status, Thrower thrower) {
 TEST(TranslateTest, EachKindOfExceptionBecomesItsRecord) {
   OwnedStatus fromRecord;
   translate(fromRecord, [] {
-    koerr::Error(koerr::koapalerr_osFault, "kosysq/stdpath_util", 249, "kosysq_debug").add("k", "v").raise();
+    koerr::Error(koerr::koapalerr_osFault, "kosysq/stdpath_util", 249, "kosysq_debug")
+        .add("k", "v")
+        .raise();
   });
   EXPECT_EQ(fromRecord.code, -52008);
-  EXPECT_EQ(fromRecord.text(),
-            "{\"error_constant\":\"koapalerr_osFault\",\"file\":\"kosysq/stdpath_util\",\"line\":249,"
-            "\"component\":\"quillon\",\"kosysq_debug\":{\"k\":\"v\"}}");
+  EXPECT_EQ(
+      fromRecord.text(),
+      "{\"error_constant\":\"koapalerr_osFault\",\"file\":\"kosysq/stdpath_util\",\"line\":249,"
+      "\"component\":\"quillon\",\"kosysq_debug\":{\"k\":\"v\"}}");
 
   OwnedStatus fromDsc;
   translate(fromDsc, [] { throw ko::dsc::exception::OutOfRange("ko/dsc/SafeInteger", 88); });
   EXPECT_EQ(fromDsc.code, -52005);
-  EXPECT_EQ(fromDsc.text(), "{\"file\":\"ko/dsc/SafeInteger\",\"line\":88,\"component\":\"quillon\"}");
+  EXPECT_EQ(fromDsc.text(),
+            "{\"file\":\"ko/dsc/SafeInteger\",\"line\":88,\"component\":\"quillon\"}");
 
   OwnedStatus fromStd;
   translate(fromStd, [] { throw std::runtime_error("disk \"full\""); });

@@ -24,7 +24,7 @@ extern "C" {
 // when the default stands, -1 on failure (also when the path does not fit or
 // an argument is null).
 __attribute__((visibility("default"))) int get_relocated_dir(const char* name, char* buffer,
-                                                              size_t size);
+                                                             size_t size);
 
 #ifdef __cplusplus
 }
