@@ -75,13 +75,6 @@ TEST_F(EnvelopeTest, CarriesCodeExplanationRecordAndResult) {
   }
 }
 
-TEST_F(EnvelopeTest, MissingExplanationsLeaveTheTextEmpty) {
-  ScopedEnv elsewhere("KOSYSQ_SHARE_DIR_FILE", dir_.write("other.dir", dir_.str() + "/nothing"));
-  OwnedStatus status(-52006);
-  EXPECT_EQ(quillon::buildEnvelope(status, ""),
-            "{\"error\":{\"success\":false,\"errorCode\":-52006,\"errorText\":\"\"}}");
-}
-
 template <typename Thrower>
 void translate(koerr::Status& status, Thrower thrower) {
   try {
