@@ -22,6 +22,10 @@ using Clock = std::chrono::steady_clock;
 
 constexpr int kListenBacklog = 1024;
 constexpr unsigned kIdleTimeoutSeconds = 60;
+// Per-connection memory for the request head and the answer's headers; heads
+// of up to about 7 KiB fit. The daemon clears this memory for every request,
+// so a larger pool costs throughput on every answer.
+constexpr size_t kConnectionMemory = 8 * 1024;
 // Buffers that grew past this for one large request are given back afterwards.
 constexpr size_t kKeptBufferBytes = 64 * 1024;
 
@@ -140,6 +144,7 @@ bool HttpServer::start(std::string& error) {
       {MHD_OPTION_NOTIFY_CONNECTION, reinterpret_cast<intptr_t>(&onConnection), this},
       {MHD_OPTION_UNESCAPE_CALLBACK, reinterpret_cast<intptr_t>(&keepEscapes), nullptr},
       {MHD_OPTION_CONNECTION_TIMEOUT, kIdleTimeoutSeconds, nullptr},
+      {MHD_OPTION_CONNECTION_MEMORY_LIMIT, kConnectionMemory, nullptr},
   };
   if (options_.threads > 1) items.push_back({MHD_OPTION_THREAD_POOL_SIZE, options_.threads, nullptr});
   items.push_back({MHD_OPTION_END, 0, nullptr});
