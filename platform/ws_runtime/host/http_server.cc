@@ -116,7 +116,8 @@ MHD_Result sendText(MHD_Connection* connection, HttpServer::Connection& state, u
 }  // namespace
 
 HttpServer::~HttpServer() {
-  if (daemon_ != nullptr) stop(std::chrono::milliseconds(0));
+  beginStop();
+  finishStop(std::chrono::milliseconds(0));
 }
 
 bool HttpServer::start(std::string& error) {
@@ -163,11 +164,14 @@ uint16_t HttpServer::port() const {
   return info != nullptr ? info->port : 0;
 }
 
-void HttpServer::stop(std::chrono::milliseconds grace) {
-  if (daemon_ == nullptr) return;
-  stopping_ = true;
+void HttpServer::beginStop() {
+  if (daemon_ == nullptr || stopping_.exchange(true)) return;
   const MHD_socket listener = MHD_quiesce_daemon(daemon_);
   if (listener != MHD_INVALID_SOCKET) ::close(listener);
+}
+
+void HttpServer::finishStop(std::chrono::milliseconds grace) {
+  if (daemon_ == nullptr) return;
   {
     std::unique_lock<std::mutex> lock(drainLock_);
     drained_.wait_for(lock, grace, [this] { return inFlight_.load() == 0; });

@@ -36,10 +36,12 @@ class HttpServer {
   [[nodiscard]] bool start(std::string& error);
   // The bound port (useful with port 0).
   uint16_t port() const;
-  // Stops accepting, lets the requests in progress finish (answering any new
-  // request on an open connection with 503) for at most `grace`, then closes
+  // Stops accepting; from now on a new request on an open connection is
+  // answered 503 and the connection closed.
+  void beginStop();
+  // Lets the requests in progress finish for at most `grace`, then closes
   // every connection and joins the threads. No Run is active afterwards.
-  void stop(std::chrono::milliseconds grace);
+  void finishStop(std::chrono::milliseconds grace);
 
   class Connection;  // per-connection state, reused across keep-alive requests
 

@@ -73,8 +73,9 @@ int main(int argc, char** argv) {
           options->pluginPath + ", " + std::to_string(options->threads) + " threads)");
       int signalNumber = 0;
       sigwait(&stopSignals, &signalNumber);
+      server.beginStop();
       say(std::string("stopping on ") + (signalNumber == SIGINT ? "SIGINT" : "SIGTERM"));
-      server.stop(kStopGrace);
+      server.finishStop(kStopGrace);
     }
   }
   // The daemon's threads are joined: no Run is active any more.
