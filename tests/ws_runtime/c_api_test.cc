@@ -46,6 +46,13 @@ TEST(RequestVariables, ReadsMethodAndHeadersWithinTheBufferSize) {
     EXPECT_STREQ(buffer, c.text);
     EXPECT_EQ(length, c.lengthAfter);
   }
+  // A fresh or reset exchange is a GET without headers.
+  exchange.reset();
+  char method[8];
+  uint32_t size = sizeof method;
+  EXPECT_EQ(ReadRequestVariable_C_REST_KO_GXWS_(exchange.id(), "REQUEST_METHOD", method, &size), 0);
+  EXPECT_STREQ(method, "GET");
+
   // An undefined variable with no room leaves the caller's buffer alone.
   char none = 'x';
   uint32_t zero = 0;

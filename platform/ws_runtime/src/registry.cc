@@ -30,9 +30,10 @@ bool Slot::lookupVariable(const std::u32string& key, std::u32string& value) cons
   return false;
 }
 
-// clear() keeps the strings' storage so that a reused slot does not allocate.
+// Back to a fresh ExchangeRequest and ExchangeResponse, keeping the strings'
+// storage so that a reused slot does not allocate.
 void Slot::clear() noexcept {
-  request.method.clear();
+  request.method.assign("GET");
   request.hasContentType = false;
   request.contentType.clear();
   request.hasAccept = false;
