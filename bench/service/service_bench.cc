@@ -55,7 +55,8 @@ void runResources(ws::runtime::Exchange& exchange) {
 }
 
 void BM_GetResourcesFourTimeReferences(benchmark::State& state) {
-  Scenario scenario(scenarioWithMasters(4));
+  // The time service reads its scenario path once per process.
+  static Scenario scenario(scenarioWithMasters(4));
   quillonInit();
   ws::runtime::Exchange exchange;
   runResources(exchange);
