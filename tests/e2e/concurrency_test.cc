@@ -111,6 +111,8 @@ TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
   for (std::thread& c : clients) c.join();
   EXPECT_EQ(wrong.load(), 0) << first;
   EXPECT_EQ(host.process().stop(), 0) << host.process().log();
+  // A sanitizer build of the host reports races and leaks in its log.
+  EXPECT_EQ(host.process().log().find("Sanitizer"), std::string::npos) << host.process().log();
 }
 
 }  // namespace
