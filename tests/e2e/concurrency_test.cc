@@ -18,18 +18,6 @@ namespace test = quillon::test_support;
 constexpr int kThreads = 8;
 constexpr int kRequestsPerThread = 2000;
 
-std::string notFoundRecord(int line, const std::string& message, const std::string& members) {
-  return "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/ResourceManager\","
-         "\"line\":" + std::to_string(line) + ",\"component\":\"quillon\",\"kosyncdomain_debug\":{"
-         "\"message\":\"" + message + "\"," + members + "}}";
-}
-
-std::string deviceDocument(const std::string& requirements, bool coherent) {
-  return std::string("{\"uri\":\"") + kDeviceUri + "\",\"coherencyRequirements\":" + requirements +
-         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") +
-         ",\"offsetNanos\":250}";
-}
-
 struct Expected {
   std::string method;
   std::string target;

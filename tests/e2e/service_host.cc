@@ -98,6 +98,18 @@ std::string errorEnvelope(int32_t code, const std::string& explanation, const st
          ",\"errorText\":" + jsonString(explanation) + ",\"errorInfo\":" + jsonString(record) + "}}";
 }
 
+std::string deviceDocument(const std::string& requirements, bool coherent) {
+  return std::string("{\"uri\":\"") + kDeviceUri + "\",\"coherencyRequirements\":" + requirements +
+         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") +
+         ",\"offsetNanos\":250}";
+}
+
+std::string notFoundRecord(int line, const std::string& message, const std::string& members) {
+  return "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/ResourceManager\","
+         "\"line\":" + std::to_string(line) + ",\"component\":\"quillon\",\"kosyncdomain_debug\":{"
+         "\"message\":\"" + message + "\"," + members + "}}";
+}
+
 std::string shippedExplanation(int32_t code) {
   std::ifstream file(std::string(QUILLON_SHARE_DIR) + "/errors/English/quillon.txt", std::ios::binary);
   const std::string text((std::istreambuf_iterator<char>(file)), std::istreambuf_iterator<char>());

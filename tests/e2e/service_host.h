@@ -60,6 +60,11 @@ class ServiceHost {
 // The envelopes, byte for byte.
 std::string successEnvelope(const std::string& result);
 std::string errorEnvelope(int32_t code, const std::string& explanation, const std::string& record);
+// The device library's document of the local time keeper.
+std::string deviceDocument(const std::string& requirements, bool coherent);
+// The resource manager's not-found record raised at `line`, with `members`
+// (already JSON) after its message.
+std::string notFoundRecord(int line, const std::string& message, const std::string& members);
 // The text as a JSON string, quotes included.
 std::string jsonString(const std::string& text);
 // The explanation of `code` in the shipped English explanations file: the

@@ -3,11 +3,7 @@
 #include <cJSON.h>
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <atomic>
 #include <string>
-#include <thread>
-#include <vector>
 
 #include "error_record/exception.h"
 #include "syncable_device/syncable_device_actual.h"
@@ -98,32 +94,6 @@ TEST(SyncableDevice, CreationFailureThrowsAndUrisAreEscapedInTheDocument) {
   ASSERT_NE(root, nullptr);
   EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(root, "uri")->valuestring, "/a\"b\\c\x01");
   cJSON_Delete(root);
-}
-
-// Readers racing a writer only ever see one of the documents it writes.
-TEST(SyncableDevice, ConcurrentWritersAndReadersSeeWholeDocuments) {
-  SyncableDeviceActual device(kUri);
-  const std::vector<std::string> allowed = {document("null", true),
-                                            document("{\"maxOffsetNanos\":100}", false),
-                                            document("{\"maxOffsetNanos\":1000}", true)};
-  std::atomic<int> bad{0};
-  std::vector<std::thread> threads;
-  for (int t = 0; t < 4; ++t) {
-    threads.emplace_back([&, t] {
-      for (int i = 0; i < 300; ++i) {
-        if (t == 0) {
-          device.setCoherencyRequirements(i % 2 ? "{\"maxOffsetNanos\":100}" : "{\"maxOffsetNanos\":1000}", "");
-        } else if (t == 1 && i % 7 == 0) {
-          device.clearCoherencyRequirements("");
-        } else {
-          const std::string text = device.toJson();
-          if (std::find(allowed.begin(), allowed.end(), text) == allowed.end()) ++bad;
-        }
-      }
-    });
-  }
-  for (auto& t : threads) t.join();
-  EXPECT_EQ(bad.load(), 0);
 }
 
 }  // namespace
