@@ -6,6 +6,7 @@
 #include <fstream>
 #include <functional>
 #include <sstream>
+#include <stdexcept>
 #include <memory>
 #include <string>
 #include <thread>
@@ -149,6 +150,41 @@ TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
   } catch (const koerr::Exception& e) {
     EXPECT_EQ(e.code(), -5);
   }
+}
+
+TEST_F(AgainstStandIn, LibraryFailuresArriveUnchangedAndNeverDuringUnwinding) {
+  install(kFourTrs + ",\"faults\":[{\"call\":\"getTrMetadataJson\",\"code\":-5}]");
+  koerr::Status status;
+  char buffer[16] = {};
+  ASSERT_EQ(status.code, 0);
+  (void)kopdmclientapi_getTrMetadataJson("bc2", buffer, sizeof buffer, &status);
+  const std::string libraryRecord = status.json != nullptr ? status.json : "";
+  koerr::releaseText(status);
+
+  std::string metadata = "unchanged";
+  try {
+    wrapper->getTrMetadataJson("bc2", &metadata);
+    FAIL() << "the failure was lost";
+  } catch (const koerr::Exception& e) {
+    EXPECT_EQ(e.code(), -5);
+    EXPECT_EQ(e.what(), libraryRecord);  // nothing added by the wrapper
+  }
+  EXPECT_EQ(metadata, "unchanged");
+
+  // A second exception would end the process; the call counts as done and
+  // hands over the (untouched, empty) buffer instead.
+  struct ReadsWhileUnwinding {
+    kopendulo::ApiWrapper& wrapper;
+    std::string& out;
+    ~ReadsWhileUnwinding() { wrapper.getTrMetadataJson("bc2", &out); }
+  };
+  try {
+    ReadsWhileUnwinding reader{*wrapper, metadata};
+    throw std::runtime_error("first");
+  } catch (const std::runtime_error& e) {
+    EXPECT_STREQ(e.what(), "first");
+  }
+  EXPECT_EQ(metadata, "");
 }
 
 TEST_F(AgainstStandIn, SelectedTrIdsUpTo255CharactersArriveWhole) {
