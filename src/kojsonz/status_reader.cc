@@ -205,16 +205,6 @@ struct KeyMatcher {
   bool matched() const { return equal && wanted[position] == '\0'; }
 };
 
-// Copies the number token so a ',' locale can be served and nothing past the
-// token is read. Null when the token does not fit.
-bool copyToken(const char* begin, const char* end, char (&out)[64]) {
-  const size_t length = static_cast<size_t>(end - begin);
-  if (length >= sizeof out) return false;
-  std::memcpy(out, begin, length);
-  out[length] = '\0';
-  return true;
-}
-
 char localeDecimalSeparator() {
   char probe[16];
   std::snprintf(probe, sizeof probe, "%.1f", 1.5);
@@ -278,14 +268,17 @@ int readInteger(const char* value, int32_t* out) {
   if (value == nullptr || out == nullptr) return 0;
   bool integer = false;
   const char* end = scanNumber(value, &integer);
-  char token[64];
-  if (end == nullptr || !integer || !copyToken(value, end, token)) return 0;
-  // Base 0 is what "%i" converts with; strtol reports overflow where the
-  // scanf family would not.
+  if (end == nullptr || !integer) return 0;
+  // A copy of just the token, so nothing past it is read. Base 0 is what
+  // "%i" converts with; strtol reports overflow where the scanf family would
+  // not.
+  const std::string token(value, end);
   errno = 0;
   char* stop = nullptr;
-  const long converted = std::strtol(token, &stop, 0);
-  if (errno != 0 || stop == token || converted < INT32_MIN || converted > INT32_MAX) return 0;
+  const long converted = std::strtol(token.c_str(), &stop, 0);
+  if (errno != 0 || stop == token.c_str() || converted < INT32_MIN || converted > INT32_MAX) {
+    return 0;
+  }
   *out = static_cast<int32_t>(converted);
   return 1;
 }
@@ -294,16 +287,18 @@ int readNumber(const char* value, double* out) {
   if (value == nullptr || out == nullptr) return 0;
   bool integer = false;
   const char* end = scanNumber(value, &integer);
-  char token[64];
-  if (end == nullptr || !copyToken(value, end, token)) return 0;
-  if (!integer) {
-    const char separator = localeDecimalSeparator();
-    if (separator != '.') {
-      if (char* dot = std::strchr(token, '.')) *dot = separator;
-    }
+  if (end == nullptr) return 0;
+  std::string token(value, end);
+  const char separator = localeDecimalSeparator();
+  if (!integer && separator != '.') {
+    // The conversion follows the locale, so the number is rewritten in its
+    // notation: at most 63 characters of it, with the locale's separator.
+    if (token.size() > 63) token.resize(63);
+    const std::string::size_type dot = token.find('.');
+    if (dot != std::string::npos) token[dot] = separator;
   }
   double converted = 0;
-  if (std::sscanf(token, "%lg", &converted) != 1) return 0;
+  if (std::sscanf(token.c_str(), "%lg", &converted) != 1) return 0;
   *out = converted;
   return 1;
 }

@@ -76,6 +76,9 @@ TEST(ReadValues, ConvertByTypeAndRefuseOthers) {
   EXPECT_EQ(kojsonz::readNumber(kojsonz::findMember(kRecord, "ratio"), &number), 1);
   EXPECT_DOUBLE_EQ(number, -1500.0);
   EXPECT_EQ(kojsonz::readInteger("2147483648", &integer), 0);
+  const std::string longFraction = "0." + std::string(80, '0') + "1";
+  EXPECT_EQ(kojsonz::readNumber(longFraction.c_str(), &number), 1);
+  EXPECT_DOUBLE_EQ(number, 1e-81);
   EXPECT_EQ(kojsonz::readInteger("42,", &integer), 1);
   EXPECT_EQ(integer, 42);
   EXPECT_EQ(kojsonz::readString(kojsonz::findMember(kRecord, "code"), &text), 0);
