@@ -24,21 +24,25 @@ struct FileCloser {
 };
 using File = std::unique_ptr<std::FILE, FileCloser>;
 
+// `path` is named only for a file that would not open: once it is open, the
+// failure lies in reading, not in which file was meant.
 void reportFileFailure(koerr::Status& status, const koerr::ErrorConstant& constant, int line,
-                       int error, const char* message, const std::string& path) {
+                       int error, const char* message, const std::string* path = nullptr) {
   char text[256] = "";
   // The GNU variant may return a static text instead of filling ours.
   const char* systemText = strerror_r(error, text, sizeof text);
-  koerr::Report(status, constant, kFile, line)
-      .open("internal_error")
+  koerr::Report report(status, constant, kFile, line);
+  report.open("internal_error")
       .add("api", "errno")
       .addInt("code", error)
       .add("string", systemText)
       .close()
       .open("kosysq_debug")
-      .add("message", message)
-      .add("path", path)
-      .close();
+      .add("message", message);
+  if (path != nullptr) {
+    report.add("path", *path);
+  }
+  report.close();
 }
 
 // Size by seeking to the end; a directory opens fine for reading on Linux but
@@ -107,14 +111,14 @@ void readWholeFile(const std::string& path, std::string& content, koerr::Status&
   File file(std::fopen(path.c_str(), "rb"));
   if (!file) {
     reportFileFailure(status, koerr::koapalerr_resourceNotFound, kOpenLine, errno,
-                      "error opening file", path);
+                      "error opening file", &path);
     return;
   }
   long size = 0;
   int error = 0;
   if (!fileSize(file.get(), size, error)) {
     reportFileFailure(status, koerr::koapalerr_osFault, kReadLine, error,
-                      "didn't read full content of file", path);
+                      "didn't read full content of file");
     return;
   }
   try {
@@ -130,7 +134,7 @@ void readWholeFile(const std::string& path, std::string& content, koerr::Status&
     error = std::ferror(file.get()) && errno != 0 ? errno : EIO;
     content.clear();
     reportFileFailure(status, koerr::koapalerr_osFault, kReadLine, error,
-                      "didn't read full content of file", path);
+                      "didn't read full content of file");
   }
 }
 

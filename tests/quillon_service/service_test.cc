@@ -3,6 +3,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <functional>
 #include <map>
 #include <stdexcept>
@@ -51,11 +52,12 @@ struct Incoming {
   std::string command, contentType, accept, body;
 };
 
-// What the client would see.
+// What the client would see, and every host call in the order made.
 struct Answer {
   std::vector<int> codes;
   std::string body;
   std::vector<std::string> mimeTypes;
+  std::vector<std::string> calls;
 };
 
 koerr::Exception record(const koerr::ErrorConstant& constant, const char* file, int line) {
@@ -69,22 +71,36 @@ class ServiceTest : public ::testing::Test {
                 const std::function<void(MockRequest&)>& breakHost = nullptr) {
     auto request = std::make_unique<NiceMock<MockRequest>>();
     MockRequest& r = *request;
-    ON_CALL(r, getRequestMethodType()).WillByDefault(Return(in.method));
-    ON_CALL(r, getCommand()).WillByDefault(Return(in.command));
-    ON_CALL(r, getContentType()).WillByDefault(Return(in.contentType));
-    ON_CALL(r, getAccept()).WillByDefault(Return(in.accept));
-    ON_CALL(r, readPostData()).WillByDefault(Return(in.body));
+    Answer seen;
+    const auto read = [&seen](const char* call, auto value) {
+      return [&seen, call, value] {
+        seen.calls.push_back(call);
+        return value;
+      };
+    };
+    ON_CALL(r, getRequestMethodType()).WillByDefault(read("method", in.method));
+    ON_CALL(r, getCommand()).WillByDefault(read("command", in.command));
+    ON_CALL(r, getContentType()).WillByDefault(read("contentType", in.contentType));
+    ON_CALL(r, getAccept()).WillByDefault(read("accept", in.accept));
+    ON_CALL(r, readPostData()).WillByDefault(read("body", in.body));
     ON_CALL(r, getUriVariable(_)).WillByDefault([](const std::string& key) {
       static const std::map<std::string, std::string> variables = {
           {"plugin", "pendulo"}, {"type", "timekeeper"}, {"name", "genericTk"},
           {"resourceType", "timescales"}};
       return variables.count(key) ? variables.at(key) : "";
     });
-    Answer seen;
-    ON_CALL(r, setHTTPResponseCode(_)).WillByDefault([&](int code) { seen.codes.push_back(code); });
-    ON_CALL(r, writeOutput(_)).WillByDefault([&](const std::string& text) { seen.body += text; });
-    ON_CALL(r, setHTTPResponseMimeType(_))
-        .WillByDefault([&](const std::string& type) { seen.mimeTypes.push_back(type); });
+    ON_CALL(r, setHTTPResponseCode(_)).WillByDefault([&](int code) {
+      seen.codes.push_back(code);
+      seen.calls.push_back("code " + std::to_string(code));
+    });
+    ON_CALL(r, writeOutput(_)).WillByDefault([&](const std::string& text) {
+      seen.body += text;
+      seen.calls.push_back("output");
+    });
+    ON_CALL(r, setHTTPResponseMimeType(_)).WillByDefault([&](const std::string& type) {
+      seen.mimeTypes.push_back(type);
+      seen.calls.push_back("mime");
+    });
     if (breakHost) {
       breakHost(r);
     }
@@ -111,6 +127,11 @@ TEST_F(ServiceTest, MapsCommandsOntoResourceOperations) {
     std::string body;
   };
   const std::string put = "{\"c\":1}";
+  const std::string noBody =
+      errorEnvelope(-411200, "",
+                    "{\"error_constant\":\"kInternalSoftwareError\",\"file\":\"quillon/Service\","
+                    "\"line\":235,\"component\":\"quillon\",\"quillon_debug\":{\"check failed\":"
+                    "\"!data.empty()\"}}");
   const Case cases[] = {
       {"GET resources, no media types", {0, "resources", "", "", ""},
        [](MockResourceManager& m) {
@@ -154,11 +175,10 @@ TEST_F(ServiceTest, MapsCommandsOntoResourceOperations) {
                      "\"line\":260,\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":"
                      "\"Sync Domain Web Service Plugin failed to process command.\",\"command\":"
                      "\"\",\"requestMethodType\":0}}")},
-      {"PUT without body", {1, "syncableDevices", "", "", ""}, nullptr, {200, -411200},
-       errorEnvelope(-411200, "",
-                     "{\"error_constant\":\"kInternalSoftwareError\",\"file\":\"quillon/Service\","
-                     "\"line\":235,\"component\":\"quillon\",\"quillon_debug\":{\"check failed\":"
-                     "\"!data.empty()\"}}")},
+      // The body is checked before the command word is looked at.
+      {"PUT without body", {1, "syncableDevices", "", "", ""}, nullptr, {200, -411200}, noBody},
+      {"PUT unknown word without body", {1, "clocks", "", "", ""}, nullptr, {200, -411200},
+       noBody},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.name);
@@ -170,6 +190,17 @@ TEST_F(ServiceTest, MapsCommandsOntoResourceOperations) {
     EXPECT_EQ(seen.codes, c.codes);
     EXPECT_EQ(seen.body, c.body);
     EXPECT_EQ(seen.mimeTypes, std::vector<std::string>{kMedia});
+    const std::vector<std::string> head{"code 200", "method", "contentType", "accept"};
+    ASSERT_GE(seen.calls.size(), head.size() + 3);
+    EXPECT_TRUE(std::equal(head.begin(), head.end(), seen.calls.begin()));
+    // A refusal never reads the command; any later status precedes the body.
+    const bool refused = c.codes.back() == 415;
+    EXPECT_EQ(seen.calls[head.size()], refused ? "code 415" : "command");
+    if (c.codes.size() > 1) {
+      EXPECT_EQ(seen.calls[seen.calls.size() - 3], "code " + std::to_string(c.codes.back()));
+    }
+    EXPECT_EQ(std::vector<std::string>(seen.calls.end() - 2, seen.calls.end()),
+              (std::vector<std::string>{"output", "mime"}));
     EXPECT_EQ(status.code, 0);
     ::testing::Mock::VerifyAndClearExpectations(manager_.get());
   }
@@ -181,7 +212,7 @@ TEST_F(ServiceTest, HostAndForeignFailuresAnswer500WithTheRawRecord) {
     EXPECT_CALL(r, getRequestMethodType())
         .WillOnce(Throw(record(koerr::kInvalidRequestMethodType, "quillon/Request", 90)));
   });
-  EXPECT_EQ(seen.codes, (std::vector<int>{200, 500}));
+  EXPECT_EQ(seen.calls, (std::vector<std::string>{"code 200", "output", "code 500"}));
   EXPECT_EQ(seen.body,
             "{\"error_constant\":\"kInvalidRequestMethodType\",\"file\":\"quillon/Request\","
             "\"line\":90,\"component\":\"quillon\"}");
@@ -193,7 +224,9 @@ TEST_F(ServiceTest, HostAndForeignFailuresAnswer500WithTheRawRecord) {
   EXPECT_CALL(*manager_, getResources(_)).WillOnce(Throw(std::runtime_error("boom")));
   OwnedStatus foreign;
   seen = answer({0, "resources", "", "", ""}, foreign);
-  EXPECT_EQ(seen.codes, (std::vector<int>{200, 500}));
+  EXPECT_EQ(seen.calls,
+            (std::vector<std::string>{"code 200", "method", "contentType", "accept", "command",
+                                      "output", "mime", "output", "code 500"}));
   EXPECT_EQ(seen.body, successEnvelope() +
                            "{\"error_constant\":\"quillon::kInternalSoftwareError\",\"file\":"
                            "\"quillon/errors\",\"line\":50,\"component\":\"quillon\","
