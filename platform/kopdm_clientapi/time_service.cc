@@ -47,6 +47,18 @@ void copyAnswer(const std::string& answer, char* buffer, uint32_t capacity) {
   buffer[length] = '\0';
 }
 
+// Publication numbers are drawn from one counter, so that a number never
+// names the snapshots of two services, even one destroyed and another built
+// at the same address.
+std::atomic<uint64_t> nextGeneration{0};
+
+// The snapshot this thread last served, and its publication number.
+struct ThreadSnapshot {
+  uint64_t generation = 0;
+  std::shared_ptr<const void> state;
+};
+thread_local ThreadSnapshot threadSnapshot;
+
 }  // namespace
 
 struct TimeService::Answer {
@@ -66,7 +78,7 @@ TimeService::TimeService(std::string path) : path_(std::move(path)) {
     pollFile_ = !watch_->active();
   }
   // Loaded after the watch exists, so an edit in between is not missed.
-  state_ = loadState();
+  publish(std::make_shared<const State>(loadState()));
 }
 
 TimeService::~TimeService() { watch_.reset(); }
@@ -98,18 +110,32 @@ TimeService::State TimeService::loadState() const {
   return state;
 }
 
-void TimeService::reload() {
-  State fresh = loadState();
-  std::unique_lock<std::shared_mutex> lock(mutex_);
-  state_ = std::move(fresh);
+void TimeService::publish(std::shared_ptr<const State> state) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  publishLocked(std::move(state));
 }
 
-void TimeService::reloadIfFileChanged() {
-  const FileStamp now = stampOf(path_);
-  {
-    std::shared_lock<std::shared_mutex> lock(mutex_);
-    if (now == state_.stamp) return;
+void TimeService::publishLocked(std::shared_ptr<const State> state) {
+  state_ = std::move(state);
+  generation_.store(nextGeneration.fetch_add(1, std::memory_order_relaxed) + 1,
+                    std::memory_order_release);
+}
+
+const TimeService::State& TimeService::current() const {
+  // The common case reads one shared word and writes nothing shared.
+  ThreadSnapshot& snapshot = threadSnapshot;
+  if (snapshot.generation != generation_.load(std::memory_order_acquire)) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    snapshot.state = state_;
+    snapshot.generation = generation_.load(std::memory_order_relaxed);
   }
+  return *static_cast<const State*>(snapshot.state.get());
+}
+
+void TimeService::reload() { publish(std::make_shared<const State>(loadState())); }
+
+void TimeService::reloadIfFileChanged() {
+  if (stampOf(path_) == current().stamp) return;
   reload();
 }
 
@@ -194,10 +220,10 @@ int32_t TimeService::serveText(const Answer& answer, const Fault* fault, std::st
 
 int32_t TimeService::getApiVersion() {
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (!state_.usable) return kScenarioUnusable;
-  if (!state_.up) return kServiceDown;
-  return state_.live.apiVersion;
+  const State& state = current();
+  if (!state.usable) return kScenarioUnusable;
+  if (!state.up) return kServiceDown;
+  return state.live.apiVersion;
 }
 
 int32_t TimeService::getSelectedTrId(char* buffer, uint32_t capacity, koerr::Status* status) {
@@ -207,9 +233,9 @@ int32_t TimeService::getSelectedTrId(char* buffer, uint32_t capacity, koerr::Sta
     return reportInvalidArgument(*status, kCall, "No buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (int32_t code = unavailable(state_, kCall, *status)) return code;
-  const Scenario& live = state_.live;
+  const State& state = current();
+  if (int32_t code = unavailable(state, kCall, *status)) return code;
+  const Scenario& live = state.live;
   const Fault* fault = live.findFault(kCall);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
   const bool selected = live.hasSelectedTr || (fault != nullptr && fault->replacesAnswer);
@@ -228,11 +254,11 @@ int32_t TimeService::getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Status*
   if (status == nullptr) return kInvalidArgument;
   if (offsetOut == nullptr) return reportInvalidArgument(*status, kCall, "No output variable.");
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (int32_t code = unavailable(state_, kCall, *status)) return code;
-  const Fault* fault = state_.live.findFault(kCall);
+  const State& state = current();
+  if (int32_t code = unavailable(state, kCall, *status)) return code;
+  const Fault* fault = state.live.findFault(kCall);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
-  *offsetOut = state_.live.selectedTrOffsetNanos;
+  *offsetOut = state.live.selectedTrOffsetNanos;
   return fault != nullptr ? reportFault(*status, *fault, {}, {}) : 0;
 }
 
@@ -244,14 +270,14 @@ int32_t TimeService::getPdmAttrJson(const char* key, char* buffer, uint32_t capa
     return reportInvalidArgument(*status, kCall, "No key or buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (int32_t code = unavailable(state_, kCall, *status)) return code;
-  const Fault* fault = state_.live.findFault(kCall, {}, key);
+  const State& state = current();
+  if (int32_t code = unavailable(state, kCall, *status)) return code;
+  const Fault* fault = state.live.findFault(kCall, {}, key);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, key);
   Answer answer{nullptr, 0};
   if (fault == nullptr || !fault->replacesAnswer) {
-    const auto found = state_.live.pdmAttrAnswers.find(std::string_view(key));
-    if (found != state_.live.pdmAttrAnswers.end()) {
+    const auto found = state.live.pdmAttrAnswers.find(std::string_view(key));
+    if (found != state.live.pdmAttrAnswers.end()) {
       answer.text = &found->second;
     } else {
       answer.code = reportNoAttr(*status, kCall, {}, key);
@@ -267,11 +293,11 @@ int32_t TimeService::getPdmMetadataJson(char* buffer, uint32_t capacity, koerr::
     return reportInvalidArgument(*status, kCall, "No buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (int32_t code = unavailable(state_, kCall, *status)) return code;
-  const Fault* fault = state_.live.findFault(kCall);
+  const State& state = current();
+  if (int32_t code = unavailable(state, kCall, *status)) return code;
+  const Fault* fault = state.live.findFault(kCall);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, {});
-  return serveText({&state_.live.pdmMetadataAnswer, 0}, fault, {}, {}, buffer, capacity,
+  return serveText({&state.live.pdmMetadataAnswer, 0}, fault, {}, {}, buffer, capacity,
                    *status);
 }
 
@@ -283,14 +309,14 @@ int32_t TimeService::getTrAttrJson(const char* trId, const char* key, char* buff
     return reportInvalidArgument(*status, kCall, "No TR, key or buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (int32_t code = unavailable(state_, kCall, *status)) return code;
-  const Fault* fault = state_.live.findFault(kCall, trId, key);
+  const State& state = current();
+  if (int32_t code = unavailable(state, kCall, *status)) return code;
+  const Fault* fault = state.live.findFault(kCall, trId, key);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, key);
   Answer answer{nullptr, 0};
   if (fault == nullptr || !fault->replacesAnswer) {
-    const auto tr = state_.live.trs.find(std::string_view(trId));
-    if (tr == state_.live.trs.end()) {
+    const auto tr = state.live.trs.find(std::string_view(trId));
+    if (tr == state.live.trs.end()) {
       answer.code = reportNoTr(*status, kCall, trId);
     } else {
       const auto found = tr->second.attrAnswers.find(std::string_view(key));
@@ -312,14 +338,14 @@ int32_t TimeService::getTrMetadataJson(const char* trId, char* buffer, uint32_t 
     return reportInvalidArgument(*status, kCall, "No TR or buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
-  std::shared_lock<std::shared_mutex> lock(mutex_);
-  if (int32_t code = unavailable(state_, kCall, *status)) return code;
-  const Fault* fault = state_.live.findFault(kCall, trId);
+  const State& state = current();
+  if (int32_t code = unavailable(state, kCall, *status)) return code;
+  const Fault* fault = state.live.findFault(kCall, trId);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, {});
   Answer answer{nullptr, 0};
   if (fault == nullptr || !fault->replacesAnswer) {
-    const auto tr = state_.live.trs.find(std::string_view(trId));
-    if (tr != state_.live.trs.end()) {
+    const auto tr = state.live.trs.find(std::string_view(trId));
+    if (tr != state.live.trs.end()) {
       answer.text = &tr->second.metadataAnswer;
     } else {
       answer.code = reportNoTr(*status, kCall, trId);
@@ -329,21 +355,26 @@ int32_t TimeService::getTrMetadataJson(const char* trId, char* buffer, uint32_t 
 }
 
 // The common frame of the state-changing calls: checks, the call's fault,
-// then `apply(state, status)` under the exclusive lock.
+// then `apply(state, status)` on a copy that replaces the served snapshot
+// when it succeeds. Readers keep serving the old one until then.
 template <typename Change>
 int32_t TimeService::change(Call call, std::string_view trId, std::string_view key,
                             koerr::Status* status, Change&& apply) {
   if (pollFile_) reloadIfFileChanged();
-  std::unique_lock<std::shared_mutex> lock(mutex_);
-  if (!state_.usable) return unavailable(state_, call, *status);
+  std::lock_guard<std::mutex> lock(mutex_);
+  // Held to the end: `fault` points into it.
+  const std::shared_ptr<const State> served = state_;
+  if (!served->usable) return unavailable(*served, call, *status);
   const bool serviceCall = call == Call::kRestartService || call == Call::kBringDownService ||
                            call == Call::kBringUpService;
   if (!serviceCall) {
-    if (int32_t code = unavailable(state_, call, *status)) return code;
+    if (int32_t code = unavailable(*served, call, *status)) return code;
   }
-  const Fault* fault = state_.live.findFault(call, trId, key);
+  const Fault* fault = served->live.findFault(call, trId, key);
   if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, key);
-  if (int32_t code = apply(state_, *status)) return code;
+  auto next = std::make_shared<State>(*served);
+  if (int32_t code = apply(*next, *status)) return code;
+  publishLocked(std::move(next));
   return fault != nullptr ? reportFault(*status, *fault, trId, key) : 0;
 }
 

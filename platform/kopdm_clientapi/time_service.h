@@ -1,20 +1,24 @@
 // The simulated time-sync manager: serves a scenario (a file, or the built-in
 // default) through the client library's calls and applies the state-changing
 // calls to it in memory. Answers are rendered when the scenario is read, so a
-// call costs a reader lock, a lookup and a copy; the file is watched by a
-// thread, so a call never looks at the file system.
+// call costs a lookup and a copy; the file is watched by a thread, so a call
+// never looks at the file system.
 //
-// Thread-safety: every operation may run on several threads at once; readers
-// share a lock, the state-changing calls and reloads take it alone.
+// Thread-safety: every operation may run on several threads at once. The
+// served state is an immutable snapshot; a reading call takes no lock while
+// its thread already holds the current one, so request threads do not
+// contend. The state-changing calls and reloads publish a new snapshot under
+// a mutex.
 #ifndef KOPDM_CLIENTAPI_TIME_SERVICE_H_
 #define KOPDM_CLIENTAPI_TIME_SERVICE_H_
 
 #include <sys/types.h>
 
+#include <atomic>
 #include <cstdint>
 #include <ctime>
 #include <memory>
-#include <shared_mutex>
+#include <mutex>
 #include <string>
 #include <string_view>
 
@@ -72,6 +76,11 @@ class TimeService {
   struct Answer;
 
   static FileStamp stampOf(const std::string& path);
+  // The state being served, valid until this thread's next call into this
+  // object.
+  const State& current() const;
+  void publish(std::shared_ptr<const State> state);
+  void publishLocked(std::shared_ptr<const State> state);  // mutex_ held
   State loadState() const;
   void reload();
   void reloadIfFileChanged();
@@ -94,8 +103,9 @@ class TimeService {
   const char* sourceName() const;
 
   const std::string path_;
-  mutable std::shared_mutex mutex_;
-  State state_;
+  mutable std::mutex mutex_;           // held to replace or to take a snapshot
+  std::shared_ptr<const State> state_;  // guarded by mutex_
+  std::atomic<uint64_t> generation_{0};  // of state_; unique in the process
   std::unique_ptr<ScenarioWatch> watch_;  // null for the built-in scenario
   bool pollFile_ = false;                  // the watch could not be set up
 };

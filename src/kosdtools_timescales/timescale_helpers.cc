@@ -93,7 +93,11 @@ std::string TimescaleHelpers::getTrGmId(const std::string& trId) {
 }
 
 std::string TimescaleHelpers::getTimescaleUri(const std::string& trId) {
-  std::string uri = kUriPrefix + trId + kDelimiter + getTrGmId(trId);
+  const std::string gmId = getTrGmId(trId);
+  // Sized once: a listing builds one of these per published TR.
+  std::string uri;
+  uri.reserve(std::char_traits<char>::length(kUriPrefix) + trId.size() + 1 + gmId.size());
+  uri.append(kUriPrefix).append(trId).append(kDelimiter).append(gmId);
   return replaceSpacesWithDashes(uri);
 }
 
@@ -116,8 +120,10 @@ std::string TimescaleHelpers::getFirstTrId() {
 std::string TimescaleHelpers::getFirstTrTimescaleUri() { return getTimescaleUri(getFirstTrId()); }
 
 std::vector<std::string> TimescaleHelpers::getTimescaleUris() {
+  const std::vector<std::string> ids = getTrIds();
   std::vector<std::string> uris;
-  for (const std::string& id : getTrIds()) {
+  uris.reserve(ids.size());
+  for (const std::string& id : ids) {
     const std::string type = getTrType(id);
     if (isBoundaryClockType(type)) {
       uris.insert(uris.begin(), getTimescaleUri(id));
@@ -217,7 +223,11 @@ std::vector<std::string> TimescaleHelpers::readStrings(const cJSON* list) {
 }
 
 std::string TimescaleHelpers::readTrAttr(const std::string& trId, const AttrRead& read) {
-  std::string answer;
+  // Each listing reads several attributes of every TR; a per-thread buffer
+  // keeps its capacity across reads, so copying the answer in allocates
+  // nothing. Nothing called below reads an attribute again on this thread.
+  thread_local std::string answer;
+  answer.clear();
   try {
     client_->getTrAttrJson(trId, read.key, &answer);
   } catch (const koerr::ExceptionBase& caught) {

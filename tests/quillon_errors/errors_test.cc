@@ -75,6 +75,14 @@ TEST_F(EnvelopeTest, CarriesCodeExplanationRecordAndResult) {
   }
 }
 
+// The result is written as a C string, so a NUL byte ends it, success or not.
+TEST_F(EnvelopeTest, ResultEndsAtItsFirstNulByte) {
+  const OwnedStatus success;
+  const std::string result("{\"a\"\0,\"b\":1}", 12);
+  EXPECT_EQ(quillon::buildEnvelope(success, result),
+            "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"},\"result\":{\"a\"}");
+}
+
 template <typename Thrower>
 void translate(koerr::Status& status, Thrower thrower) {
   try {
