@@ -35,6 +35,21 @@ std::string entries(const std::vector<std::string>& uris) {
   return out;
 }
 
+const cJSON* member(const cJSON* object, const char* key) {
+  return cJSON_GetObjectItemCaseSensitive(object, key);
+}
+
+// An error answer parsed: the envelope, and the record inside its "errorInfo".
+struct ErrorAnswer {
+  explicit ErrorAnswer(const std::string& body) : envelope(cJSON_Parse(body.c_str())) {
+    const cJSON* info = member(member(envelope, "error"), "errorInfo");
+    record = cJSON_IsString(info) ? cJSON_Parse(info->valuestring) : nullptr;
+  }
+  ~ErrorAnswer() { cJSON_Delete(record); cJSON_Delete(envelope); }
+  cJSON* envelope;
+  cJSON* record;
+};
+
 void expectAnswer(const test::HttpResponse& r, int status, const std::string& body,
                   const char* statusCodeHeader = nullptr) {
   EXPECT_EQ(r.status, status);
@@ -126,17 +141,11 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
     const test::HttpResponse r = host.put(kDeviceUri, bad, vendor);
     EXPECT_EQ(r.status, 500);
     EXPECT_EQ(r.header("X-Status-Code").value_or(""), "-52005");
-    cJSON* envelope = cJSON_Parse(r.body.c_str());
-    const cJSON* error = cJSON_GetObjectItemCaseSensitive(envelope, "error");
-    const cJSON* info = cJSON_GetObjectItemCaseSensitive(error, "errorInfo");
-    ASSERT_TRUE(cJSON_IsString(info)) << r.body;
-    cJSON* record = cJSON_Parse(info->valuestring);
-    EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(record, "error_constant")->valuestring,
-                 "koapalerr_invalidParameter");
-    EXPECT_NE(cJSON_GetObjectItemCaseSensitive(record, "kosdlib_debug"), nullptr) << info->valuestring;
-    EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(envelope, "result"), nullptr);
-    cJSON_Delete(record);
-    cJSON_Delete(envelope);
+    const ErrorAnswer answer(r.body);
+    ASSERT_NE(answer.record, nullptr) << r.body;
+    EXPECT_STREQ(member(answer.record, "error_constant")->valuestring, "koapalerr_invalidParameter");
+    EXPECT_NE(member(answer.record, "kosdlib_debug"), nullptr) << r.body;
+    EXPECT_EQ(member(answer.envelope, "result"), nullptr);
   }
   const std::string wrong = "/quillon/syncableDevices/pendulo/timekeeper/generictk";
   expectAnswer(host.put(wrong, "{}"), 500,
@@ -180,30 +189,20 @@ TEST(ServiceOverHttp, TimeServiceErrorsReachTheClientAsTheirEnvelope) {
       const test::HttpResponse r = host.get(target);
       EXPECT_EQ(r.status, 500);
       EXPECT_EQ(r.header("X-Status-Code").value_or(""), std::to_string(c.code));
-      cJSON* envelope = cJSON_Parse(r.body.c_str());
-      const cJSON* error = cJSON_GetObjectItemCaseSensitive(envelope, "error");
-      ASSERT_NE(error, nullptr) << r.body;
-      EXPECT_TRUE(cJSON_IsFalse(cJSON_GetObjectItemCaseSensitive(error, "success")));
-      EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(error, "errorCode")->valueint, c.code);
-      cJSON* record = cJSON_Parse(cJSON_GetObjectItemCaseSensitive(error, "errorInfo")->valuestring);
-      ASSERT_NE(record, nullptr) << r.body;
-      EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(record, "error_constant")->valuestring,
-                   c.constant.c_str());
-      EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(record, "file")->valuestring,
-                   "kosdtools_timescales/timescaleHelpers");
-      EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(record, "line")->valueint, c.line);
-      const cJSON* debug = cJSON_GetObjectItemCaseSensitive(record, "kosyncdomain_debug");
-      EXPECT_STREQ(cJSON_GetObjectItemCaseSensitive(debug, "message")->valuestring, c.message.c_str());
-      const cJSON* nested = cJSON_GetObjectItemCaseSensitive(record, "nested_error");
-      if (c.nestedCode == 0) {
-        EXPECT_EQ(nested, nullptr);
-      } else {
-        ASSERT_EQ(cJSON_GetArraySize(nested), 1);
-        EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(cJSON_GetArrayItem(nested, 0), "code")->valueint,
-                  c.nestedCode);
-      }
-      cJSON_Delete(record);
-      cJSON_Delete(envelope);
+      const ErrorAnswer answer(r.body);
+      const cJSON* error = member(answer.envelope, "error");
+      ASSERT_NE(answer.record, nullptr) << r.body;
+      EXPECT_TRUE(cJSON_IsFalse(member(error, "success")));
+      EXPECT_EQ(member(error, "errorCode")->valueint, c.code);
+      const cJSON* record = answer.record;
+      EXPECT_STREQ(member(record, "error_constant")->valuestring, c.constant.c_str());
+      EXPECT_STREQ(member(record, "file")->valuestring, "kosdtools_timescales/timescaleHelpers");
+      EXPECT_EQ(member(record, "line")->valueint, c.line);
+      EXPECT_STREQ(member(member(record, "kosyncdomain_debug"), "message")->valuestring, c.message.c_str());
+      const cJSON* nested = member(record, "nested_error");
+      EXPECT_EQ(nested == nullptr, c.nestedCode == 0);
+      ASSERT_EQ(cJSON_GetArraySize(nested), c.nestedCode == 0 ? 0 : 1);
+      if (c.nestedCode != 0) EXPECT_EQ(member(cJSON_GetArrayItem(nested, 0), "code")->valueint, c.nestedCode);
     }
     EXPECT_EQ(host.process().stop(), 0);
   }

@@ -2,12 +2,16 @@
 // scenario files that each test writes.
 #include <cjson/cJSON.h>
 #include <gtest/gtest.h>
+#include <stdlib.h>
+#include <unistd.h>
 
+#include <chrono>
+#include <cstdio>
 #include <fstream>
 #include <functional>
+#include <memory>
 #include <sstream>
 #include <stdexcept>
-#include <memory>
 #include <string>
 #include <thread>
 #include <vector>
@@ -15,13 +19,63 @@
 #include "error_record/error.h"
 #include "kopdm_clientapi.h"
 #include "kopdm_clientapi/api_wrapper.h"
-#include "kopdm_clientapi/scenario_file.h"
 #include "kosdtools_timescales/timescale_helpers.h"
 
 namespace {
 
-using timesvc_test::install;
 using Strings = std::vector<std::string>;
+
+// The scenario the stand-in of this process serves. KOPDM_SIM_SCENARIO is set
+// before main() runs, so the stand-in's first call already reads it; it
+// notices rewrites on its own watch thread.
+std::string makeScenarioPath() {
+  char dir[] = "/tmp/kopdm_sim_test_XXXXXX";
+  if (mkdtemp(dir) == nullptr) std::abort();
+  const std::string path = std::string(dir) + "/scenario.json";
+  setenv("KOPDM_SIM_SCENARIO", path.c_str(), 1);
+  return path;
+}
+const std::string kScenario = makeScenarioPath();
+
+struct RemoveScenario : ::testing::Environment {
+  void TearDown() override {
+    std::remove(kScenario.c_str());
+    rmdir(kScenario.substr(0, kScenario.rfind('/')).c_str());
+  }
+};
+::testing::Environment* const kCleanup = ::testing::AddGlobalTestEnvironment(new RemoveScenario);
+
+// True once `condition` holds, false when it did not within ten seconds.
+bool eventually(const std::function<bool()>& condition) {
+  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+  while (!condition()) {
+    if (std::chrono::steady_clock::now() > deadline) return false;
+    std::this_thread::yield();
+  }
+  return true;
+}
+
+// Writes `text` (renamed over the scenario when `atomically`, else in place)
+// and waits until `served()` holds.
+void serve(const std::string& text, const std::function<bool()>& served, bool atomically = false) {
+  const std::string path = atomically ? kScenario + ".new" : kScenario;
+  std::ofstream(path, std::ios::binary | std::ios::trunc) << text;
+  if (atomically) ASSERT_EQ(std::rename(path.c_str(), kScenario.c_str()), 0);
+  ASSERT_TRUE(eventually(served)) << text;
+}
+
+// Serves `{"pdmMetadata":{"revision":N},<members>}`, N counting installs.
+void install(const std::string& members) {
+  static int revision = 0;
+  const std::string metadata = "{\"revision\":" + std::to_string(++revision) + "}";
+  serve("{\"pdmMetadata\":" + metadata + "," + members + "}", [&] {
+    char buffer[1024] = {};
+    koerr::Status status;
+    kopdmclientapi_getPdmMetadataJson(buffer, sizeof buffer, &status);
+    koerr::releaseText(status);
+    return metadata == buffer;
+  }, true);
+}
 
 constexpr int32_t kAttrNotSet = -1074100990;
 constexpr int32_t kServiceDown = -1074100992;
@@ -68,7 +122,7 @@ std::string unusableBecause(kopendulo::ApiWrapper& wrapper) {
     Record record(e.what());
     const cJSON* debug = record.at("kopdmclientapi_debug");
     if (e.code() == kScenarioUnusable &&
-        record.text("scenarioFile", debug) == timesvc_test::scenarioPath()) {
+        record.text("scenarioFile", debug) == kScenario) {
       return record.text("message", debug);
     }
   }
@@ -263,15 +317,16 @@ TEST_F(AgainstStandIn, RewrittenOrBrokenScenarioFilesAreServedOnTheNextCall) {
   for (const Broken& broken : cases) {
     SCOPED_TRACE(broken.text);
     const std::string message = std::string("Unusable scenario: ") + broken.problem + ".";
-    timesvc_test::installRaw(broken.text, [&] { return unusableBecause(*wrapper) == message; });
+    serve(broken.text, [&] { return unusableBecause(*wrapper) == message; });
     std::string answer = "unchanged";
     EXPECT_THROW(wrapper->getPdmAttrJson("timeReferences", &answer), koerr::Exception);
     EXPECT_EQ(answer, "unchanged");
   }
-  timesvc_test::removeScenario([&] {
+  ASSERT_EQ(std::remove(kScenario.c_str()), 0);
+  EXPECT_TRUE(eventually([&] {
     return unusableBecause(*wrapper) ==
            "Unusable scenario: the file cannot be opened: No such file or directory.";
-  });
+  }));
   install(kFourTrs);
   EXPECT_EQ(helpers.getTimescaleUris().size(), 3u);
 }
@@ -322,7 +377,7 @@ TEST_F(AgainstStandIn, ExampleScenariosAreServedAsDocumented) {
     cJSON_DeleteItemFromObjectCaseSensitive(scenario.root, "pdmMetadata");
     cJSON_AddItemToObject(scenario.root, "pdmMetadata", cJSON_Parse(marker.c_str()));
     char* marked = cJSON_PrintUnformatted(scenario.root);
-    timesvc_test::installRaw(marked, [&] {
+    serve(marked, [&] {
       std::string metadata;
       try {
         wrapper->getPdmMetadataJson(&metadata);

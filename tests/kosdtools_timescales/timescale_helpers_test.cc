@@ -123,6 +123,11 @@ TEST(TimescaleHelpers, OrdersBoundaryClocksAndTheSelectedSlaveFirstAndMastersLas
   EXPECT_EQ(helpers.getTimescaleUris(),
             (Strings{prefix + "f/gf", prefix + "a/ga", prefix + "b/gb", prefix + "g/gg",
                      prefix + "tr-8/gm-A"}));
+  // Nothing selected: no slave is published.
+  service.selected = "";
+  EXPECT_EQ(helpers.getTimescaleUris(),
+            (Strings{prefix + "f/gf", prefix + "a/ga", prefix + "b/gb", prefix + "g/gg",
+                     prefix + "tr-8/gm-A"}));
 }
 
 TEST(TimescaleHelpers, ComposedOperationsGoThroughOverrides) {
@@ -282,21 +287,6 @@ TEST(TimescaleHelpers, TrListsAreReadLenientlyButNeverGuessed) {
   EXPECT_EQ(thrownBy([&] { (void)helpers.getFirstTrGmId(); }),
             helperRecord("koapalerr_resourceNotFound", 146, olderService,
                          nestedServiceError(-1074100990)));
-}
-
-TEST(TimescaleHelpers, SelectedSlaveNeedsBothTheSelectionAndTheSlavePort) {
-  Service service;
-  service.add("s", "IEEE 1588-2008", "g", "PTP_SLAVE");
-  service.add("m", "IEEE 1588-2008", "g", "PTP_MASTER");
-  kosdtools::pendulo::TimescaleHelpers helpers(service.client);
-  EXPECT_FALSE(helpers.isTrSelectedSlave("s"));  // nothing selected
-  service.selected = "m";
-  EXPECT_FALSE(helpers.isTrSelectedSlave("s"));
-  EXPECT_FALSE(helpers.isTrSelectedSlave("m"));
-  EXPECT_TRUE(helpers.isTrMasterOrDisabled("m"));
-  service.selected = "s";
-  EXPECT_TRUE(helpers.isTrSelectedSlave("s"));
-  EXPECT_FALSE(helpers.isTrMasterOrDisabled("s"));
 }
 
 TEST(TimescaleHelpers, NormalizingDropsTheRemoteHostOnly) {

@@ -21,18 +21,7 @@ constexpr int kTimeoutSeconds = 30;
   throw std::runtime_error("http client: " + what);
 }
 
-bool hasHeader(const HeaderList& headers, std::string_view name) {
-  for (const auto& [key, value] : headers) {
-    if (key.size() == name.size() && ::strncasecmp(key.data(), name.data(), name.size()) == 0) {
-      return true;
-    }
-  }
-  return false;
-}
-
-}  // namespace
-
-std::optional<std::string> HttpResponse::header(std::string_view name) const {
+std::optional<std::string> findHeader(const HeaderList& headers, std::string_view name) {
   for (const auto& [key, value] : headers) {
     if (key.size() == name.size() && ::strncasecmp(key.data(), name.data(), name.size()) == 0) {
       return value;
@@ -41,11 +30,17 @@ std::optional<std::string> HttpResponse::header(std::string_view name) const {
   return std::nullopt;
 }
 
-HttpClient::HttpClient(uint16_t port, const std::string& address) {
+}  // namespace
+
+std::optional<std::string> HttpResponse::header(std::string_view name) const {
+  return findHeader(headers, name);
+}
+
+HttpClient::HttpClient(uint16_t port) {
   sockaddr_in target{};
   target.sin_family = AF_INET;
   target.sin_port = htons(port);
-  if (inet_pton(AF_INET, address.c_str(), &target.sin_addr) != 1) fail("bad address " + address);
+  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
   fd_ = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
   if (fd_ < 0) fail(std::string("socket: ") + std::strerror(errno));
   timeval timeout{kTimeoutSeconds, 0};
@@ -56,7 +51,7 @@ HttpClient::HttpClient(uint16_t port, const std::string& address) {
   if (::connect(fd_, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
     const std::string reason = std::strerror(errno);
     ::close(fd_);
-    fail("connect to " + address + ":" + std::to_string(port) + ": " + reason);
+    fail("connect to port " + std::to_string(port) + ": " + reason);
   }
 }
 
@@ -101,10 +96,10 @@ std::string HttpClient::readExactly(size_t size) {
 HttpResponse HttpClient::send(const HttpRequest& request) {
   if (closed_) fail("the server closed this connection");
   std::string text = request.method + " " + request.target + " HTTP/1.1\r\n";
-  if (!hasHeader(request.headers, "Host")) text += "Host: 127.0.0.1\r\n";
+  if (!findHeader(request.headers, "Host")) text += "Host: 127.0.0.1\r\n";
   for (const auto& [name, value] : request.headers) text += name + ": " + value + "\r\n";
-  if (!hasHeader(request.headers, "Content-Length") &&
-      !hasHeader(request.headers, "Transfer-Encoding") &&
+  if (!findHeader(request.headers, "Content-Length") &&
+      !findHeader(request.headers, "Transfer-Encoding") &&
       (!request.body.empty() || request.method == "PUT" || request.method == "POST")) {
     text += "Content-Length: " + std::to_string(request.body.size()) + "\r\n";
   }
@@ -131,33 +126,19 @@ HttpResponse HttpClient::send(const HttpRequest& request) {
                                   valueStart == std::string::npos ? "" : line.substr(valueStart));
   }
 
-  const auto connection = response.header("Connection");
-  const bool closeAfter =
-      connection && ::strcasecmp(connection->c_str(), "close") == 0;
-  const bool noBody = request.method == "HEAD" || response.status == 204 ||
-                      response.status == 304 || response.status / 100 == 1;
-  const auto encoding = response.header("Transfer-Encoding");
+  // The host answers from a buffer, so every answer it sends has a length.
   const auto length = response.header("Content-Length");
-  if (noBody) {
-  } else if (encoding && ::strcasecmp(encoding->c_str(), "chunked") == 0) {
-    while (true) {
-      const size_t size = std::stoul(readLine(), nullptr, 16);
-      if (size == 0) {
-        while (!readLine().empty()) {
-        }
-        break;
-      }
-      response.body += readExactly(size);
-      readLine();
-    }
-  } else if (length) {
+  const bool noBody = response.status == 204 || response.status == 304;
+  if (length) {
     response.body = readExactly(std::stoul(*length));
-  } else {
+  } else if (!noBody) {
     while (fill()) {
     }
     response.body.swap(buffer_);
     closed_ = true;
   }
+  const auto connection = response.header("Connection");
+  const bool closeAfter = connection && ::strcasecmp(connection->c_str(), "close") == 0;
   if (closeAfter) closed_ = true;
   return response;
 }

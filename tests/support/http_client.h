@@ -26,7 +26,7 @@ struct HttpRequest {
 struct HttpResponse {
   int status = 0;
   HeaderList headers;  // in the order received
-  std::string body;    // de-chunked
+  std::string body;
 
   // The first header of that name (case-insensitive).
   std::optional<std::string> header(std::string_view name) const;
@@ -34,8 +34,8 @@ struct HttpResponse {
 
 class HttpClient {
  public:
-  // Connects to `address`:`port`. Throws std::runtime_error on failure.
-  explicit HttpClient(uint16_t port, const std::string& address = "127.0.0.1");
+  // Connects to 127.0.0.1:`port`. Throws std::runtime_error on failure.
+  explicit HttpClient(uint16_t port);
   ~HttpClient();
   HttpClient(const HttpClient&) = delete;
   HttpClient& operator=(const HttpClient&) = delete;

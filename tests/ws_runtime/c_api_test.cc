@@ -170,10 +170,6 @@ TEST(RequestInfo, LooksUpVariablesFirstDefinitionWinsAndLeavesMissesUntouched) {
   EXPECT_EQ(info.command(), U"resources");
 }
 
-}  // namespace
-
-namespace {
-
 TEST(Identifiers, ConcurrentRequestsNeverSeeEachOthersAnswers) {
   constexpr int kThreads = 4;
   constexpr int kRequests = 2000;

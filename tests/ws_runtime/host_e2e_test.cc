@@ -1,16 +1,13 @@
 // ws-runtime over real HTTP, serving the echo plug-in.
-#include <arpa/inet.h>
-#include <netinet/in.h>
-#include <sys/socket.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <csignal>
-#include <cstdio>
-#include <fcntl.h>
+#include <filesystem>
 #include <fstream>
 #include <future>
-#include <sstream>
+#include <iterator>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -26,27 +23,17 @@ using quillon::test_support::HttpRequest;
 using quillon::test_support::HttpResponse;
 
 // A scratch directory for the plug-in's log and gate, removed afterwards.
-class Scratch {
- public:
-  Scratch() {
+struct Scratch {
+  const std::string dir = [] {
     char pattern[] = "/tmp/ws-runtime-e2e-XXXXXX";
-    dir_ = ::mkdtemp(pattern);
-  }
-  ~Scratch() {
-    ::unlink(file("log").c_str());
-    ::unlink(file("gate").c_str());
-    ::rmdir(dir_.c_str());
-  }
-  std::string file(const char* name) const { return dir_ + "/" + name; }
+    return std::string(::mkdtemp(pattern));
+  }();
+  ~Scratch() { std::filesystem::remove_all(dir); }
+  std::string file(const char* name) const { return dir + "/" + name; }
   std::string read(const char* name) const {
     std::ifstream in(file(name));
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
+    return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
   }
-
- private:
-  std::string dir_;
 };
 
 std::vector<std::string> echoArgs(std::vector<std::string> extra = {}) {
@@ -177,16 +164,8 @@ TEST(HostEndToEnd, ConcurrentClientsEachGetTheirOwnAnswers) {
 }
 
 TEST(HostEndToEnd, StartUpFailuresNameTheirCause) {
-  // An address that is taken.
-  const int taken = ::socket(AF_INET, SOCK_STREAM, 0);
-  sockaddr_in address{};
-  address.sin_family = AF_INET;
-  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  ASSERT_EQ(::bind(taken, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
-  ASSERT_EQ(::listen(taken, 1), 0);
-  socklen_t length = sizeof address;
-  ::getsockname(taken, reinterpret_cast<sockaddr*>(&address), &length);
-  const std::string busy = "127.0.0.1:" + std::to_string(ntohs(address.sin_port));
+  HostProcess holder(echoArgs({"--quiet"}));  // takes the address of the last case
+  const std::string busy = "127.0.0.1:" + std::to_string(holder.port());
 
   struct Case {
     std::vector<std::string> args;
@@ -206,7 +185,6 @@ TEST(HostEndToEnd, StartUpFailuresNameTheirCause) {
     EXPECT_EQ(run.exitCode, c.exitCode);
     EXPECT_NE(run.log.find(c.logPart), std::string::npos) << run.log;
   }
-  ::close(taken);
 }
 
 TEST(HostEndToEnd, StopLetsTheRequestInProgressFinishThenFinalizesOnce) {

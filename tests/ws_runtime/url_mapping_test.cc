@@ -84,12 +84,6 @@ TEST(UrlMapping, RejectsOtherPathsAndBadEncodingsWithoutTouchingTheRequest) {
   }
 }
 
-TEST(UrlMapping, PathIsTheWholeDecodedPath) {
-  ws::runtime::ExchangeRequest request;
-  ASSERT_EQ(ws::host::mapUrl("quillon", "/quillon/t/a%2Fb/c/d", {}, request), Mapping::kMapped);
-  EXPECT_EQ(request.path, U"/quillon/t/a/b/c/d");
-}
-
 TEST(Options, ParsesFlagsAndNamesTheBadOne) {
   std::string error;
   auto options = ws::host::parseOptions({"--listen", "[::1]:0", "--plugin", "/x.so", "--service",

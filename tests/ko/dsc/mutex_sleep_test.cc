@@ -2,8 +2,8 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
 #include <filesystem>
+#include <fstream>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -17,27 +17,17 @@ namespace ko::dsc::osdep {
 namespace {
 
 // A flag file in a fresh temporary directory; `content` null means no file.
-class FlagFile {
- public:
+struct FlagFile {
   explicit FlagFile(const char* content) {
-    char dir[] = "/tmp/ko_dsc_rt_XXXXXX";
-    dir_ = mkdtemp(dir);
-    path_ = dir_ + "/realtime";
-    if (content != nullptr) {
-      write(content);
-    }
+    if (content != nullptr) write(content);
   }
-  ~FlagFile() { std::filesystem::remove_all(dir_); }
-  void write(const std::string& content) const {
-    FILE* f = std::fopen(path_.c_str(), "w");
-    std::fputs(content.c_str(), f);
-    std::fclose(f);
-  }
-  const std::string& path() const { return path_; }
-
- private:
-  std::string dir_;
-  std::string path_;
+  ~FlagFile() { std::filesystem::remove_all(dir); }
+  void write(const std::string& content) const { std::ofstream(path) << content; }
+  const std::string dir = [] {
+    char pattern[] = "/tmp/ko_dsc_rt_XXXXXX";
+    return std::string(mkdtemp(pattern));
+  }();
+  const std::string path = dir + "/realtime";
 };
 
 TEST(RealtimeKernel, OnlyALeadingOneMeansRealtimeAndTheAnswerIsReadOnce) {
@@ -49,7 +39,7 @@ TEST(RealtimeKernel, OnlyALeadingOneMeansRealtimeAndTheAnswerIsReadOnce) {
   for (const auto& c : cases) {
     SCOPED_TRACE(c.content == nullptr ? "<no file>" : c.content);
     const FlagFile flag(c.content);
-    const RealtimeKernel kernel(flag.path());
+    const RealtimeKernel kernel(flag.path);
     EXPECT_EQ(kernel.isRealtime(), c.realtime);
     // The protocol follows the kernel.
     EXPECT_EQ(RecursiveMutex(kernel).inheritsPriority(), c.realtime);
@@ -60,7 +50,7 @@ TEST(RealtimeKernel, OnlyALeadingOneMeansRealtimeAndTheAnswerIsReadOnce) {
 
 TEST(RecursiveMutex, NestsForItsOwnerAndIgnoresUnlockFromOtherThreads) {
   const FlagFile flag(nullptr);
-  const RealtimeKernel kernel(flag.path());
+  const RealtimeKernel kernel(flag.path);
   RecursiveMutex mutex(kernel);
   EXPECT_EQ(mutex.owner(), pthread_t{0});
   mutex.lock();
