@@ -202,7 +202,9 @@ TEST(ServiceOverHttp, TimeServiceErrorsReachTheClientAsTheirEnvelope) {
       const cJSON* nested = member(record, "nested_error");
       EXPECT_EQ(nested == nullptr, c.nestedCode == 0);
       ASSERT_EQ(cJSON_GetArraySize(nested), c.nestedCode == 0 ? 0 : 1);
-      if (c.nestedCode != 0) EXPECT_EQ(member(cJSON_GetArrayItem(nested, 0), "code")->valueint, c.nestedCode);
+      if (c.nestedCode != 0) {
+        EXPECT_EQ(member(cJSON_GetArrayItem(nested, 0), "code")->valueint, c.nestedCode);
+      }
     }
     EXPECT_EQ(host.process().stop(), 0);
   }

@@ -60,7 +60,9 @@ bool eventually(const std::function<bool()>& condition) {
 void serve(const std::string& text, const std::function<bool()>& served, bool atomically = false) {
   const std::string path = atomically ? kScenario + ".new" : kScenario;
   std::ofstream(path, std::ios::binary | std::ios::trunc) << text;
-  if (atomically) ASSERT_EQ(std::rename(path.c_str(), kScenario.c_str()), 0);
+  if (atomically) {
+    ASSERT_EQ(std::rename(path.c_str(), kScenario.c_str()), 0);
+  }
   ASSERT_TRUE(eventually(served)) << text;
 }
 

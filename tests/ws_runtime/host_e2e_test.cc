@@ -70,8 +70,6 @@ TEST(HostEndToEnd, MapsDecodesAndKeepsTheConnectionAlive) {
     const char* body;
   } hostAnswers[] = {
       {"/other/echo", 404, "Not Found\n"},
-      {"/echo/echo/a", 404, "Not Found\n"},
-      {"/echo", 404, "Not Found\n"},
       {"/echo/%zz", 400, "Bad Request: malformed escape or invalid UTF-8 in URL\n"},
   };
   for (const Case& c : hostAnswers) {
