@@ -114,21 +114,30 @@ struct Record {
   cJSON* root;
 };
 
+// What `call` raised: the code and the record (code 0 when nothing was thrown).
+struct Raised {
+  int32_t code = 0;
+  std::string record = "<nothing thrown>";
+};
+Raised raisedBy(const std::function<void()>& call) {
+  try {
+    call();
+  } catch (const koerr::Exception& e) {
+    return {e.code(), e.what()};
+  }
+  return {};
+}
+
 // The message of the record every call fails with while the scenario is
 // unusable, checking the record's code and file name on the way.
 std::string unusableBecause(kopendulo::ApiWrapper& wrapper) {
-  try {
-    std::string answer;
-    wrapper.getTrMetadataJson("any", &answer);
-  } catch (const koerr::Exception& e) {
-    Record record(e.what());
-    const cJSON* debug = record.at("kopdmclientapi_debug");
-    if (e.code() == kScenarioUnusable &&
-        record.text("scenarioFile", debug) == kScenario) {
-      return record.text("message", debug);
-    }
-  }
-  return "<usable>";
+  std::string answer;
+  const Raised failure = raisedBy([&] { wrapper.getTrMetadataJson("any", &answer); });
+  const Record record(failure.record.c_str());
+  const cJSON* debug = record.at("kopdmclientapi_debug");
+  return failure.code == kScenarioUnusable && record.text("scenarioFile", debug) == kScenario
+             ? record.text("message", debug)
+             : "<usable>";
 }
 
 class AgainstStandIn : public ::testing::Test {
@@ -164,34 +173,25 @@ TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
           "{\"call\":\"getTrAttrJson\",\"trId\":\"idle3\",\"code\":-1074100990},"
           "{\"call\":\"setTrAttr\",\"code\":-5}]");
 
-  try {
-    (void)helpers.getTrType("bc2");
-    FAIL() << "a malformed answer was accepted";
-  } catch (const koerr::Exception& e) {
-    EXPECT_STREQ(e.what(),
-                 "{\"error_constant\":\"koapalerr_invalidParameter\","
-                 "\"file\":\"kosdtools_timescales/timescaleHelpers\",\"line\":232,"
-                 "\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"Failed to parse "
-                 "typeKey key from trTypeJson.\",\"typeKey\":\"type\",\"trTypeJson\":\"not json\"}}");
-  }
+  EXPECT_EQ(raisedBy([&] { (void)helpers.getTrType("bc2"); }).record,
+            "{\"error_constant\":\"koapalerr_invalidParameter\","
+            "\"file\":\"kosdtools_timescales/timescaleHelpers\",\"line\":232,"
+            "\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"Failed to parse "
+            "typeKey key from trTypeJson.\",\"typeKey\":\"type\",\"trTypeJson\":\"not json\"}}");
   // The warning on every grandmaster read is dropped: the URI still comes out.
   EXPECT_EQ(helpers.getTimescaleUri("master0"), "/quillon/timescales/pendulo/master0/gm-m");
 
-  try {
-    (void)helpers.getTrType("idle3");
-    FAIL() << "an unset type was accepted";
-  } catch (const koerr::Exception& e) {
-    Record record(e.what());
-    EXPECT_EQ(e.code(), -52006);
-    EXPECT_EQ(record.number("line"), 214);
-    const cJSON* nested = cJSON_GetArrayItem(record.at("nested_error"), 0);
-    ASSERT_NE(nested, nullptr) << e.what();
-    EXPECT_EQ(record.text("error_constant", nested), "kopdmclientapi_injectedFault");
-    EXPECT_EQ(record.number("code", nested), kAttrNotSet);
-    const cJSON* debug = record.at("kopdmclientapi_debug", nested);
-    EXPECT_EQ(record.number("fault", debug), 2);
-    EXPECT_EQ(record.text("trId", debug), "idle3");
-  }
+  const Raised unset = raisedBy([&] { (void)helpers.getTrType("idle3"); });
+  const Record record(unset.record.c_str());
+  EXPECT_EQ(unset.code, -52006);
+  EXPECT_EQ(record.number("line"), 214);
+  const cJSON* nested = cJSON_GetArrayItem(record.at("nested_error"), 0);
+  ASSERT_NE(nested, nullptr) << unset.record;
+  EXPECT_EQ(record.text("error_constant", nested), "kopdmclientapi_injectedFault");
+  EXPECT_EQ(record.number("code", nested), kAttrNotSet);
+  const cJSON* debug = record.at("kopdmclientapi_debug", nested);
+  EXPECT_EQ(record.number("fault", debug), 2);
+  EXPECT_EQ(record.text("trId", debug), "idle3");
 
   std::string metadata;
   wrapper->getTrMetadataJson("long", &metadata);
@@ -200,12 +200,7 @@ TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
   wrapper->getTrMetadataJson("longer", &metadata);
   EXPECT_EQ(metadata, "{\"t\":\"" + longText + "y\"");  // cut to the buffer less its NUL
 
-  try {
-    wrapper->setTrAttr("bc2", "portState", "PTP_MASTER");
-    FAIL() << "the injected failure was lost";
-  } catch (const koerr::Exception& e) {
-    EXPECT_EQ(e.code(), -5);
-  }
+  EXPECT_EQ(raisedBy([&] { wrapper->setTrAttr("bc2", "portState", "PTP_MASTER"); }).code, -5);
 }
 
 TEST_F(AgainstStandIn, LibraryFailuresArriveUnchangedAndNeverDuringUnwinding) {
@@ -218,13 +213,9 @@ TEST_F(AgainstStandIn, LibraryFailuresArriveUnchangedAndNeverDuringUnwinding) {
   koerr::releaseText(status);
 
   std::string metadata = "unchanged";
-  try {
-    wrapper->getTrMetadataJson("bc2", &metadata);
-    FAIL() << "the failure was lost";
-  } catch (const koerr::Exception& e) {
-    EXPECT_EQ(e.code(), -5);
-    EXPECT_EQ(e.what(), libraryRecord);  // nothing added by the wrapper
-  }
+  const Raised failure = raisedBy([&] { wrapper->getTrMetadataJson("bc2", &metadata); });
+  EXPECT_EQ(failure.code, -5);
+  EXPECT_EQ(failure.record, libraryRecord);  // nothing added by the wrapper
   EXPECT_EQ(metadata, "unchanged");
 
   // A second exception would end the process; the call counts as done and
@@ -288,12 +279,7 @@ TEST_F(AgainstStandIn, StateChangingCallsActOnTheServedState) {
 
   wrapper->bringDownService();
   EXPECT_EQ(wrapper->getApiVersion(), kServiceDown);
-  try {
-    (void)helpers.getTimescaleUris();
-    FAIL() << "a service that is down answered";
-  } catch (const koerr::Exception& e) {
-    EXPECT_EQ(e.code(), kServiceDown);
-  }
+  EXPECT_EQ(raisedBy([&] { (void)helpers.getTimescaleUris(); }).code, kServiceDown);
   wrapper->bringUpService();
   EXPECT_EQ(helpers.getTimescaleUris().size(), 4u);
 }
@@ -388,12 +374,9 @@ TEST_F(AgainstStandIn, ExampleScenariosAreServedAsDocumented) {
       return metadata == marker;
     });
     cJSON_free(marked);
-    try {
-      EXPECT_EQ(helpers.getTimescaleUris(), example.uris);
-      EXPECT_EQ(example.code, 0);
-    } catch (const koerr::Exception& e) {
-      EXPECT_EQ(e.code(), example.code) << e.what();
-    }
+    Strings uris;
+    EXPECT_EQ(raisedBy([&] { uris = helpers.getTimescaleUris(); }).code, example.code);
+    EXPECT_EQ(uris, example.uris);
   }
 }
 
@@ -437,19 +420,13 @@ TEST(ApiWrapper, MissingOutParametersAreRefusedBeforeTheLibraryIsCalled) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.name);
-    try {
-      c.call();
-      FAIL() << "no error";
-    } catch (const koerr::Exception& e) {
-      EXPECT_EQ(e.code(), -52005);
-      EXPECT_EQ(std::string(e.what()),
-                "{\"error_constant\":\"koapalerr_invalidParameter\","
-                "\"file\":\"kopdm_clientapi/apiWrapper\",\"line\":" +
-                    std::to_string(c.line) +
-                    ",\"component\":\"quillon\",\"kopendulo_debug\":{\"message\":\"Encountered "
-                    "missing parameter needed for task completion.\",\"" +
-                    c.name + "\":\"nullptr\"}}");
-    }
+    const Raised refused = raisedBy(c.call);
+    EXPECT_EQ(refused.code, -52005);
+    EXPECT_EQ(refused.record,
+              "{\"error_constant\":\"koapalerr_invalidParameter\","
+              "\"file\":\"kopdm_clientapi/apiWrapper\",\"line\":" + std::to_string(c.line) +
+                  ",\"component\":\"quillon\",\"kopendulo_debug\":{\"message\":\"Encountered "
+                  "missing parameter needed for task completion.\",\"" + c.name + "\":\"nullptr\"}}");
   }
 }
 

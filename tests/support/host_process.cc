@@ -9,8 +9,8 @@
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
+#include <iterator>
 #include <map>
-#include <sstream>
 #include <stdexcept>
 #include <thread>
 
@@ -27,9 +27,7 @@ constexpr const char* kListeningMarker = "listening on ";
 
 std::string readFile(const std::string& path) {
   std::ifstream in(path, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  return text.str();
+  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
 }
 
 std::string makeLogFile() {
@@ -171,14 +169,9 @@ HostRun runHostToExit(const std::vector<std::string>& args, const Environment& e
   std::vector<std::string> argv = {kWsRuntimePath};
   argv.insert(argv.end(), args.begin(), args.end());
   const pid_t pid = spawn(argv, env, logPath);
-  const auto deadline = Clock::now() + timeout;
   int status = 0;
-  while (::waitpid(pid, &status, WNOHANG) != pid) {
-    if (Clock::now() > deadline) {
-      ::kill(pid, SIGKILL);
-      ::waitpid(pid, &status, 0);
-      break;
-    }
+  for (const auto deadline = Clock::now() + timeout; ::waitpid(pid, &status, WNOHANG) != pid;) {
+    if (Clock::now() > deadline) ::kill(pid, SIGKILL);  // reaped on the next turn
     std::this_thread::sleep_for(kPollInterval);
   }
   HostRun run{decodeWaitStatus(status), readFile(logPath)};

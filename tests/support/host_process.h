@@ -43,7 +43,6 @@ class HostProcess {
   HostProcess& operator=(const HostProcess&) = delete;
 
   uint16_t port() const { return port_; }
-  pid_t pid() const { return pid_; }
 
   // Sends `signal` and waits for the host to end. Returns its exit code, or
   // 128 + the signal number when a signal ended it.
