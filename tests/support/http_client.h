@@ -17,7 +17,7 @@ namespace quillon::test_support {
 using HeaderList = std::vector<std::pair<std::string, std::string>>;
 
 struct HttpRequest {
-  std::string method = "GET";
+  std::string method = "GET";  // any but HEAD: answers are read by their length
   std::string target = "/";  // path and query, sent as is
   HeaderList headers;        // Host and Content-Length are added unless given
   std::string body;
