@@ -270,20 +270,21 @@ int32_t TimeService::getPdmAttrJson(const char* key, char* buffer, uint32_t capa
     return reportInvalidArgument(*status, kCall, "No key or buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
+  const std::string_view keyView(key);
   const State& state = current();
   if (int32_t code = unavailable(state, kCall, *status)) return code;
-  const Fault* fault = state.live.findFault(kCall, {}, key);
-  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, key);
+  const Fault* fault = state.live.findFault(kCall, {}, keyView);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, {}, keyView);
   Answer answer{nullptr, 0};
   if (fault == nullptr || !fault->replacesAnswer) {
-    const auto found = state.live.pdmAttrAnswers.find(std::string_view(key));
+    const auto found = state.live.pdmAttrAnswers.find(keyView);
     if (found != state.live.pdmAttrAnswers.end()) {
       answer.text = &found->second;
     } else {
-      answer.code = reportNoAttr(*status, kCall, {}, key);
+      answer.code = reportNoAttr(*status, kCall, {}, keyView);
     }
   }
-  return serveText(answer, fault, {}, key, buffer, capacity, *status);
+  return serveText(answer, fault, {}, keyView, buffer, capacity, *status);
 }
 
 int32_t TimeService::getPdmMetadataJson(char* buffer, uint32_t capacity, koerr::Status* status) {
@@ -309,25 +310,28 @@ int32_t TimeService::getTrAttrJson(const char* trId, const char* key, char* buff
     return reportInvalidArgument(*status, kCall, "No TR, key or buffer, or a capacity of 0.");
   }
   if (pollFile_) reloadIfFileChanged();
+  // Measured once: the lookups below and any report take them as views.
+  const std::string_view trView(trId);
+  const std::string_view keyView(key);
   const State& state = current();
   if (int32_t code = unavailable(state, kCall, *status)) return code;
-  const Fault* fault = state.live.findFault(kCall, trId, key);
-  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trId, key);
+  const Fault* fault = state.live.findFault(kCall, trView, keyView);
+  if (fault != nullptr && fault->code < 0) return reportFault(*status, *fault, trView, keyView);
   Answer answer{nullptr, 0};
   if (fault == nullptr || !fault->replacesAnswer) {
-    const auto tr = state.live.trs.find(std::string_view(trId));
+    const auto tr = state.live.trs.find(trView);
     if (tr == state.live.trs.end()) {
-      answer.code = reportNoTr(*status, kCall, trId);
+      answer.code = reportNoTr(*status, kCall, trView);
     } else {
-      const auto found = tr->second.attrAnswers.find(std::string_view(key));
+      const auto found = tr->second.attrAnswers.find(keyView);
       if (found != tr->second.attrAnswers.end()) {
         answer.text = &found->second;
       } else {
-        answer.code = reportNoAttr(*status, kCall, trId, key);
+        answer.code = reportNoAttr(*status, kCall, trView, keyView);
       }
     }
   }
-  return serveText(answer, fault, trId, key, buffer, capacity, *status);
+  return serveText(answer, fault, trView, keyView, buffer, capacity, *status);
 }
 
 int32_t TimeService::getTrMetadataJson(const char* trId, char* buffer, uint32_t capacity,

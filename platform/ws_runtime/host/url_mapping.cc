@@ -1,5 +1,7 @@
 #include "url_mapping.h"
 
+#include <array>
+
 namespace ws::host {
 
 namespace {
@@ -15,18 +17,22 @@ int hexValue(char c) {
   return -1;
 }
 
-std::vector<std::string_view> splitPath(std::string_view path) {
-  std::vector<std::string_view> segments;
+// The segments after the leading '/'; counting stops one past the longest
+// route, which is enough to refuse a longer path.
+using Segments = std::array<std::string_view, kWithResource + 1>;
+size_t splitPath(std::string_view path, Segments& segments) {
+  size_t count = 0;
   size_t start = 1;  // after the leading '/'
-  while (true) {
+  while (count < segments.size()) {
     const size_t slash = path.find('/', start);
     if (slash == std::string_view::npos) {
-      segments.push_back(path.substr(start));
-      return segments;
+      segments[count++] = path.substr(start);
+      return count;
     }
-    segments.push_back(path.substr(start, slash - start));
+    segments[count++] = path.substr(start, slash - start);
     start = slash + 1;
   }
+  return count;
 }
 
 bool decodeComponent(std::string_view raw, std::string& scratch, std::u32string& out) {
@@ -92,37 +98,40 @@ bool utf8Decode(std::string_view text, std::u32string& out) {
 Mapping mapUrl(std::string_view service, std::string_view rawPath,
                const std::vector<RawParameter>& query, ws::runtime::ExchangeRequest& request) {
   if (rawPath.empty() || rawPath.front() != '/') return Mapping::kNotFound;
-  const std::vector<std::string_view> raw = splitPath(rawPath);
-  std::string scratch;
+  Segments raw;
+  const size_t count = splitPath(rawPath, raw);
+  // Every request passes through here: per-thread scratch keeps its storage,
+  // and the request's own strings are decoded into in place, so a mapping
+  // allocates nothing once warm.
+  thread_local std::string scratch;
+  thread_local std::u32string checked;
   if (!percentDecode(raw[0], scratch) || scratch != service) return Mapping::kNotFound;
-  if (raw.size() != kCommandOnly && raw.size() != kWithResource) return Mapping::kNotFound;
-
-  std::vector<std::u32string> segments(raw.size());
-  for (size_t i = 1; i < raw.size(); ++i) {
+  if (count != kCommandOnly && count != kWithResource) return Mapping::kNotFound;
+  for (size_t i = 1; i < count; ++i) {
     if (raw[i].empty()) return Mapping::kNotFound;
-    if (!decodeComponent(raw[i], scratch, segments[i])) return Mapping::kBadRequest;
+    if (!decodeComponent(raw[i], scratch, checked)) return Mapping::kBadRequest;
   }
-  std::vector<std::pair<std::u32string, std::u32string>> parameters;
-  parameters.reserve(query.size());
   for (const RawParameter& parameter : query) {
-    std::u32string key, value;
-    if (!decodeComponent(parameter.key, scratch, key) ||
-        !decodeComponent(parameter.value, scratch, value)) {
+    if (!decodeComponent(parameter.key, scratch, checked) ||
+        !decodeComponent(parameter.value, scratch, checked)) {
       return Mapping::kBadRequest;
     }
-    parameters.emplace_back(std::move(key), std::move(value));
   }
-
-  // Each segment is valid on its own, so the whole path decodes too.
-  std::u32string path;
-  decodeComponent(rawPath, scratch, path);
-  request.path = std::move(path);
-  request.command = std::move(segments[1]);
+  // Everything decodes, so the request is written only now and in full.
+  decodeComponent(rawPath, scratch, request.path);
+  decodeComponent(raw[1], scratch, request.command);
   request.variables.clear();
-  for (size_t i = 2; i < segments.size(); ++i) {
-    request.addVariable(kResourceVariables[i - 2], std::move(segments[i]));
+  for (size_t i = 2; i < count; ++i) {
+    std::u32string value;
+    decodeComponent(raw[i], scratch, value);
+    request.addVariable(kResourceVariables[i - 2], std::move(value));
   }
-  for (auto& [key, value] : parameters) request.addVariable(std::move(key), std::move(value));
+  for (const RawParameter& parameter : query) {
+    std::u32string key, value;
+    decodeComponent(parameter.key, scratch, key);
+    decodeComponent(parameter.value, scratch, value);
+    request.addVariable(std::move(key), std::move(value));
+  }
   return Mapping::kMapped;
 }
 
