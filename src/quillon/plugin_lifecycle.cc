@@ -17,8 +17,8 @@ constexpr int32_t kLineInit = 45;
 constexpr int32_t kLineRun = 80;
 constexpr int32_t kServiceUnavailable = 503;
 
-// The record is built and released: nobody reads it, but a debugger or a
-// record hook sees the same record as every other failure.
+// The record is built and released: nobody reads it, but a debugger stopped
+// here sees the same record as every other failure.
 void discardInternalError(int32_t line, const char* what) noexcept {
   try {
     koerr::Exception discarded =

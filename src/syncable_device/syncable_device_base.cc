@@ -1,7 +1,9 @@
 #include "syncable_device/syncable_device_base.h"
 
 #include <cstdlib>
+#include <exception>
 #include <memory>
+#include <stdexcept>
 
 #include "kosdlib/kosdlib.h"
 #include "syncable_device/call_guard.h"
@@ -47,7 +49,16 @@ std::string SyncableDeviceBase::toJson() {
   std::unique_ptr<char, decltype(&std::free)> text(
       kosdlib_SyncableDevice_toJson(handle_, guard.record()), &std::free);
   guard.check();
-  return text ? std::string(text.get()) : std::string();
+  if (text == nullptr) {
+    // No document and no reason: the string library's own refusal turns it
+    // into an internal error instead of a success without a document. While
+    // another exception unwinds nothing may be thrown, so it is empty then.
+    if (std::uncaught_exceptions() == 0) {
+      throw std::logic_error("basic_string: construction from null is not valid");
+    }
+    return std::string();
+  }
+  return std::string(text.get());
 }
 
 SyncableDeviceHandle SyncableDeviceBase::getHandle() { return handle_; }

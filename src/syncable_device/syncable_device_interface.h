@@ -29,7 +29,8 @@ class SyncableDeviceInterface {
   virtual int32_t isCoherent(int32_t argument) = 0;
   // The library's own text, valid while the device lives; copy it to keep it.
   virtual const char* getUri() = 0;
-  // The device document exactly as the library renders it.
+  // The device document exactly as the library renders it; throws
+  // std::logic_error when the library gives no text and reports no error.
   virtual std::string toJson() = 0;
   virtual SyncableDeviceHandle getHandle() = 0;
   virtual SyncableDeviceHandle getNativeHandle() = 0;
