@@ -27,7 +27,11 @@ int handleStorage;
 const auto kHandle = reinterpret_cast<kosdlib_SyncableDeviceHandle>(&handleStorage);
 
 void report(kosdlib_Status* status) {
-  if (script.code != 0) koerr::Report(*status, script.code, "libError", "lib/file", 9);
+  if (script.code == 0) return;
+  koerr::Report(*status, script.code, "libError", "lib/file", 9)
+      .open("lib_debug")
+      .add("k", "v")
+      .close();
 }
 
 // The outcome of toJson: its text, or "code|record" / "logic_error|what".
@@ -51,14 +55,15 @@ TEST(ScriptedDeviceLibrary, ToJsonFreesTheTextOnEveryPathAndNeverReturnsNoDocume
   script = Script{};
   SyncableDeviceActual device("/d");
   const std::string record =
-      "{\"error_constant\":\"libError\",\"file\":\"lib/file\",\"line\":9,\"component\":\"quillon\"}";
+      "{\"error_constant\":\"libError\",\"file\":\"lib/file\",\"line\":9,\"component\":\"quillon\","
+      "\"lib_debug\":{\"k\":\"v\"}}";
   struct Case {
     int32_t code;
     const char* text;
     std::string expected;
   } cases[] = {
       {0, "{\"a\":1}", "{\"a\":1}"},
-      {5, "{\"a\":1}", "{\"a\":1}"},
+      {5, "{\"a\":1}", "{\"a\":1}"},  // a warning is dropped, its text freed
       {-52000, "{\"a\":1}", "-52000|" + record},  // ASan reports the text if it is not freed
       {-52000, nullptr, "-52000|" + record},
       {0, nullptr, "logic_error|basic_string: construction from null is not valid"},
