@@ -3,7 +3,7 @@
 #include <dlfcn.h>
 #include <gtest/gtest.h>
 
-#include "answers_common/fixtures.h"
+#include "support/answer_fixtures.h"
 
 namespace {
 

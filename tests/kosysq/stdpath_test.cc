@@ -5,7 +5,7 @@
 
 #include <map>
 
-#include "answers_common/fixtures.h"
+#include "support/answer_fixtures.h"
 
 namespace {
 

@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "answers_common/fixtures.h"
+#include "support/answer_fixtures.h"
 
 namespace {
 

@@ -6,7 +6,7 @@
 #include <cstring>
 #include <filesystem>
 
-#include "answers_common/fixtures.h"
+#include "support/answer_fixtures.h"
 
 namespace {
 

@@ -8,7 +8,7 @@
 #include <map>
 #include <stdexcept>
 
-#include "answers_common/fixtures.h"
+#include "support/answer_fixtures.h"
 #include "error_record/constants.h"
 #include "error_record/error.h"
 

@@ -4,7 +4,7 @@
 
 #include <stdexcept>
 
-#include "answers_common/fixtures.h"
+#include "support/answer_fixtures.h"
 #include "error_record/constants.h"
 #include "error_record/error.h"
 #include "ko/dsc/exception.h"
