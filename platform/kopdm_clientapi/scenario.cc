@@ -8,6 +8,8 @@
 #include <memory>
 #include <set>
 
+#include "error_record/json_text.h"
+
 namespace kopdmsim {
 namespace {
 
@@ -37,28 +39,6 @@ std::string compact(const cJSON* value) {
   std::unique_ptr<char, TextDeleter> text(cJSON_PrintUnformatted(value));
   if (!text) invalid("out of memory while rendering a value");
   return text.get();
-}
-
-void appendEscaped(std::string& out, std::string_view text) {
-  for (const unsigned char c : text) {
-    switch (c) {
-      case '"': out += "\\\""; break;
-      case '\\': out += "\\\\"; break;
-      case '\b': out += "\\b"; break;
-      case '\f': out += "\\f"; break;
-      case '\n': out += "\\n"; break;
-      case '\r': out += "\\r"; break;
-      case '\t': out += "\\t"; break;
-      default:
-        if (c < 0x20) {
-          char escaped[8];
-          std::snprintf(escaped, sizeof escaped, "\\u%04x", c);
-          out += escaped;
-        } else {
-          out += static_cast<char>(c);
-        }
-    }
-  }
 }
 
 std::string quoted(const char* name) { return std::string("\"") + name + "\""; }
@@ -111,7 +91,7 @@ std::string trListAnswer(const cJSON* trs) {
   for (const cJSON* tr = trs->child; tr != nullptr; tr = tr->next) {
     if (list.size() > 1) list += ',';
     list += '"';
-    appendEscaped(list, tr->string);
+    koerr::appendJsonEscaped(list, tr->string);
     list += '"';
   }
   list += ']';
@@ -274,7 +254,7 @@ bool parseScenario(const std::string& text, Scenario* out, std::string* problem)
 std::string renderMember(std::string_view key, std::string_view valueJson) {
   std::string member = "{\"";
   member.reserve(key.size() + valueJson.size() + 6);
-  appendEscaped(member, key);
+  koerr::appendJsonEscaped(member, key);
   member += "\":";
   member += valueJson;
   member += '}';
@@ -288,7 +268,7 @@ std::string valueFromText(const char* text) {
     if (printed) return printed.get();
   }
   std::string value = "\"";
-  appendEscaped(value, text);
+  koerr::appendJsonEscaped(value, text);
   value += '"';
   return value;
 }

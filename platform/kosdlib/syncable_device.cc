@@ -10,6 +10,7 @@
 #include <string>
 
 #include "error_record/error.h"
+#include "error_record/json_text.h"
 #include "kosdlib/kosdlib.h"
 
 namespace {
@@ -27,30 +28,6 @@ void reportInvalid(kosdlib_Status* status, int32_t line, const char* message) {
 void reportMemoryFull(kosdlib_Status* status, int32_t line, const char* function) {
   koerr::Report(*status, koerr::koapalerr_memoryFull, kFile, line)
       .open(kChannel).add("message", "Out of memory.").add("function", function).close();
-}
-
-void appendEscaped(std::string& out, const char* text) {
-  static const char kHex[] = "0123456789abcdef";
-  for (const char* p = text; *p; ++p) {
-    const unsigned char c = static_cast<unsigned char>(*p);
-    switch (c) {
-      case '"': out += "\\\""; break;
-      case '\\': out += "\\\\"; break;
-      case '\b': out += "\\b"; break;
-      case '\f': out += "\\f"; break;
-      case '\n': out += "\\n"; break;
-      case '\r': out += "\\r"; break;
-      case '\t': out += "\\t"; break;
-      default:
-        if (c < 0x20 || c == 0x7f) {
-          out += "\\u00";
-          out += kHex[c >> 4];
-          out += kHex[c & 0xf];
-        } else {
-          out += static_cast<char>(c);
-        }
-    }
-  }
 }
 
 // The bound that the stored requirements set, or 0 when they set none.
@@ -181,7 +158,7 @@ char* kosdlib_SyncableDevice_toJson(kosdlib_SyncableDeviceHandle device, kosdlib
     std::string text;
     text.reserve(160 + device->uri.size());
     text += "{\"uri\":\"";
-    appendEscaped(text, device->uri.c_str());
+    koerr::appendJsonEscaped(text, device->uri);
     text += "\",\"coherencyRequirements\":";
     bool coherent;
     {
@@ -190,7 +167,7 @@ char* kosdlib_SyncableDevice_toJson(kosdlib_SyncableDeviceHandle device, kosdlib
       coherent = withinBound(requiredMaxOffset(device->requirements));
     }
     text += ",\"plugin\":\"";
-    appendEscaped(text, device->kind.c_str());
+    koerr::appendJsonEscaped(text, device->kind);
     text += "\",\"coherent\":";
     text += coherent ? "true" : "false";
     text += ",\"offsetNanos\":";

@@ -5,6 +5,7 @@
 #include <charconv>
 #include <cstring>
 
+#include "error_record/json_text.h"
 #include "error_record/status.h"
 
 namespace koerr {
@@ -35,9 +36,9 @@ size_t pieceLength(const Piece& piece) {
   return length;
 }
 
-char* writeEscaped(char* out, const Piece& piece) {
+// The escaped bytes of `piece`, without the surrounding quotes.
+char* writeEscapedBody(char* out, const Piece& piece) {
   static const char kHex[] = "0123456789abcdef";
-  *out++ = '"';
   for (size_t i = 0; i < piece.size; ++i) {
     const unsigned char c = static_cast<unsigned char>(piece.data[i]);
     char shortForm = 0;
@@ -65,6 +66,12 @@ char* writeEscaped(char* out, const Piece& piece) {
       *out++ = static_cast<char>(c);
     }
   }
+  return out;
+}
+
+char* writeEscaped(char* out, const Piece& piece) {
+  *out++ = '"';
+  out = writeEscapedBody(out, piece);
   *out++ = '"';
   return out;
 }
@@ -178,5 +185,12 @@ char* addRawElement(char* cursor, const char* json, Status& status) {
 }
 
 char* leaveContainer(char* cursor) { return cursor != nullptr ? cursor + 1 : nullptr; }
+
+void appendJsonEscaped(std::string& out, std::string_view text) {
+  const Piece piece{text.data(), text.size(), true};
+  const size_t start = out.size();
+  out.resize(start + pieceLength(piece) - 2);  // the length counts the quotes
+  writeEscapedBody(&out[start], piece);
+}
 
 }  // namespace koerr

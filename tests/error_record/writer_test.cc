@@ -3,6 +3,7 @@
 #include <string>
 #include <vector>
 
+#include "error_record/json_text.h"
 #include "error_record/record_checks.h"
 #include "error_record/status.h"
 
@@ -66,6 +67,9 @@ TEST(Writers, EscapeKeysAndValues) {
     const cJSON* member = cJSON_GetObjectItemCaseSensitive(root.get(), c.raw.c_str());
     ASSERT_NE(member, nullptr);
     EXPECT_EQ(std::string(member->valuestring), c.raw);
+    std::string appended = "<";
+    koerr::appendJsonEscaped(appended, c.raw);
+    EXPECT_EQ(appended, "<" + std::string(c.written + 1, std::strlen(c.written) - 2));
     koerr::releaseText(status);
   }
 }
