@@ -1,9 +1,6 @@
 // The HTTP/1.1 front of the host: a libmicrohttpd daemon (epoll, internal
 // thread pool, keep-alive) that routes each request for the mounted service
-// to the plug-in's Run entry point and sends back what it wrote. One thread
-// of its own accepts connections and deals them out to the pool in turn, so
-// a burst of new connections does not pile onto whichever pool thread woke
-// first.
+// to the plug-in's Run entry point and sends back what it wrote.
 //
 // Thread-safety: start() and stop() from one controlling thread; requests are
 // answered on the pool's threads.
@@ -16,7 +13,6 @@
 #include <cstdint>
 #include <mutex>
 #include <string>
-#include <thread>
 
 #include <microhttpd.h>
 
@@ -57,8 +53,6 @@ class HttpServer {
   MHD_Result runPlugin(MHD_Connection* connection, Connection& state, const char* method,
                        ws::runtime::Exchange& exchange);
   void requestDone(Connection& state);
-  void acceptConnections();
-  void stopAccepting();
 
   static MHD_Result onRequest(void* self, MHD_Connection* connection, const char* url,
                               const char* method, const char* version, const char* uploadData,
@@ -72,9 +66,6 @@ class HttpServer {
   const Plugin& plugin_;
   const AccessLog& log_;
   MHD_Daemon* daemon_ = nullptr;
-  int listenFd_ = -1;
-  int stopAcceptFd_ = -1;  // an eventfd that ends the accepting thread
-  std::thread acceptor_;
   std::atomic<bool> stopping_{false};
   std::atomic<int> inFlight_{0};
   std::mutex drainLock_;
