@@ -5,7 +5,12 @@
 #   immediate  ws-runtime + the echo plug-in's fixed 200-byte answer (/echo/resources)
 #   quillon    ws-runtime + libquillon.so.1 over the platform stand-ins (/quillon/resources)
 #   nginx-*    nginx (2 workers, keep-alive) serving each answer's bytes and Content-Type
+#   bare       libmicrohttpd alone (bare-http-daemon, 2 pool threads) serving the
+#              immediate answer: the floor under the host on this machine
 # Prints requests per second and p99 latency per run, then the mean ratios.
+# On 2 cores wrk takes one; the daemon's pool threads accept for themselves,
+# so a run's connections land on one thread or are split, and single runs
+# differ by up to a third: compare means over several rounds.
 #
 # Usage: bench/host/run.sh [ROUNDS]      (installs wrk and nginx when missing)
 set -euo pipefail
@@ -16,7 +21,7 @@ build="$root/build/release"
 
 "$root/scripts/install-deps.sh" perf || apt-get install -y -qq --no-install-recommends wrk nginx-light
 cmake --preset release -S "$root" >/dev/null
-cmake --build "$build" -j "$(nproc)" --target ws-runtime quillon ws_runtime_echo_plugin >/dev/null
+cmake --build "$build" -j "$(nproc)" --target ws-runtime quillon ws_runtime_echo_plugin bare-http-daemon >/dev/null
 
 work=$(mktemp -d /tmp/bench-host-XXXXXX)
 chmod 755 "$work"
@@ -63,6 +68,14 @@ for target in immediate quillon; do
   curl -fs -D "$work/$target.head" -o "$work/www/$target" "$url"
   types[$target]=$(grep -i '^content-type:' "$work/$target.head" | cut -d' ' -f2- | tr -d '\r')
 done
+bare_port=$(free_port)
+"$build/bin/bare-http-daemon" "$bare_port" 2 "$work/www/immediate" "${types[immediate]}" \
+  2>>"$work/host.log" &
+pids+=($!)
+wait_for "http://127.0.0.1:$bare_port/"
+curl -fs "http://127.0.0.1:$bare_port/" | cmp -s - "$work/www/immediate" ||
+  { echo "bench: the bare daemon does not serve the immediate answer" >&2; exit 1; }
+
 cat >"$work/nginx/nginx.conf" <<CONF
 worker_processes 2;
 daemon off;
@@ -103,10 +116,11 @@ declare -A sum
 printf '%-6s %-14s %5s %12s %10s\n' round target conns 'req/s' 'p99 ms'
 for round in $(seq 1 "$rounds"); do
   for conns in 16 64; do
-    for target in immediate nginx-immediate quillon nginx-quillon; do
+    for target in immediate nginx-immediate bare quillon nginx-quillon; do
       case $target in
         immediate) url="http://127.0.0.1:$host_port/echo/resources" ;;
         quillon) url="http://127.0.0.1:$quillon_port/quillon/resources" ;;
+        bare) url="http://127.0.0.1:$bare_port/" ;;
         nginx-*) url="http://127.0.0.1:$nginx_port/${target#nginx-}" ;;
       esac
       read -r rps p99 < <(measure "$url" "$conns")
@@ -117,8 +131,12 @@ for round in $(seq 1 "$rounds"); do
 done
 echo
 for conns in 16 64; do
-  for target in immediate quillon; do
-    awk -v t="$target" -v c="$conns" -v h="${sum[$target-$conns]}" -v n="${sum[nginx-$target-$conns]}" \
-      'BEGIN { printf "ratio %-9s -c%-3s host/nginx = %.2f\n", t, c, h / n }'
-  done
+  ratio() {  # label numerator denominator
+    awk -v l="$1" -v c="$conns" -v h="${sum[$2-$conns]}" -v n="${sum[$3-$conns]}" \
+      'BEGIN { printf "ratio -c%-3s %-26s = %.2f\n", c, l, h / n }'
+  }
+  ratio "immediate host/nginx" immediate nginx-immediate
+  ratio "immediate host/bare" immediate bare
+  ratio "bare/nginx" bare nginx-immediate
+  ratio "quillon host/nginx" quillon nginx-quillon
 done
