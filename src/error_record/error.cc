@@ -36,12 +36,20 @@ Report& Report::location(const char* file, int32_t line) {
 }
 
 Report& Report::open(const char* key) {
-  if (taken_) cursor_ = addObject(start(), key, status_);
+  if (taken_) {
+    cursor_ = addObject(start(), key, status_);
+    ++openObjects_;
+  }
   return *this;
 }
 
 Report& Report::close() {
-  if (taken_) cursor_ = leaveContainer(cursor_);
+  // Stepping past the root's brace would put later members outside the
+  // object and leave the record unparsable.
+  if (taken_ && openObjects_ > 0) {
+    cursor_ = leaveContainer(cursor_);
+    --openObjects_;
+  }
   return *this;
 }
 
@@ -83,6 +91,7 @@ Report& Report::nest(Status& caught) {
   // Nesting may move the buffer; later members go at the root.
   started_ = true;
   cursor_ = beginJson(status_, 2);
+  openObjects_ = 0;
   return *this;
 }
 

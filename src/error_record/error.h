@@ -42,6 +42,7 @@ class Report {
   Report& location(const char* file, int32_t line);
   // Opens a nested object; the following members go inside until close().
   Report& open(const char* key);
+  // Leaves the innermost open object; with none open it does nothing.
   Report& close();
   Report& add(const char* key, const char* value);
   Report& add(const char* key, const std::string& value);
@@ -50,7 +51,8 @@ class Report {
   Report& addBool(const char* key, bool value);
   Report& addRaw(const char* key, const char* json);
   Report& addRaw(const char* key, const std::string& json);
-  // Keeps `caught` inside this record under "nested_error".
+  // Keeps `caught` inside this record under "nested_error", at the root: any
+  // open objects count as closed afterwards.
   Report& nest(Status& caught);
 
  private:
@@ -62,6 +64,7 @@ class Report {
   bool taken_;
   bool started_ = false;
   char* cursor_ = nullptr;
+  int openObjects_ = 0;
 };
 
 // Builds a fresh record and throws it. The channel object, when named, is

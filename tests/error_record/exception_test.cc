@@ -99,7 +99,8 @@ TEST(ErrorHelpers, WriteTheStandardMembersInOrder) {
   caught.code = -1074100991;
   Status nesting;
   koerr::Report(nesting, koerr::koapalerr_resourceNotFound, "f", 1)
-      .open("kosyncdomain_debug").add("message", "m").nest(caught).add("after", "root");
+      .open("kosyncdomain_debug").add("message", "m").nest(caught).close().close()
+      .add("after", "root");
   EXPECT_STREQ(nesting.json,
                R"({"error_constant":"koapalerr_resourceNotFound","file":"f","line":1,)"
                R"("component":"quillon","kosyncdomain_debug":{"message":"m"},)"
