@@ -56,6 +56,14 @@ MHD_Result collectParameter(void* list, MHD_ValueKind, const char* key, const ch
   return MHD_YES;
 }
 
+// Each pool thread runs one request at a time, so it keeps one exchange for
+// all of them: the registry's lock and the slot's memory are then touched by
+// that thread alone instead of passing between cores on every request.
+ws::runtime::Exchange& threadExchange() {
+  thread_local ws::runtime::Exchange exchange;
+  return exchange;
+}
+
 void shrinkIfLarge(std::string& buffer) {
   if (buffer.capacity() > kKeptBufferBytes) std::string().swap(buffer);
   buffer.clear();
@@ -76,6 +84,13 @@ class HttpServer::Connection {
   std::string path;
   unsigned status = 0;
   size_t bytes = 0;
+
+  void setClient(MHD_Connection* connection) {
+    const MHD_ConnectionInfo* info =
+        MHD_get_connection_info(connection, MHD_CONNECTION_INFO_CLIENT_ADDRESS);
+    client = numericAddress(info != nullptr ? info->client_addr : nullptr);
+    clientWide.assign(client.begin(), client.end());
+  }
 
   void finish() {
     bodyTooLarge = false;
@@ -206,26 +221,18 @@ void HttpServer::onRequestDone(void* self, MHD_Connection*, void** requestContex
   *requestContext = nullptr;
 }
 
-void HttpServer::onConnection(void*, MHD_Connection* connection, void** socketContext,
+void HttpServer::onConnection(void*, MHD_Connection*, void** socketContext,
                               MHD_ConnectionNotificationCode event) {
   if (event == MHD_CONNECTION_NOTIFY_CLOSED) {
     delete static_cast<Connection*>(*socketContext);
     *socketContext = nullptr;
     return;
   }
-  auto* state = new (std::nothrow) Connection();
-  if (state != nullptr) {
-    const MHD_ConnectionInfo* info =
-        MHD_get_connection_info(connection, MHD_CONNECTION_INFO_CLIENT_ADDRESS);
-    try {
-      state->client = numericAddress(info != nullptr ? info->client_addr : nullptr);
-      state->clientWide.assign(state->client.begin(), state->client.end());
-    } catch (const std::exception&) {
-      delete state;
-      state = nullptr;
-    }
-  }
-  *socketContext = state;
+  // Only the allocation happens here, on the accepting path; the address is
+  // written out at the connection's first request. A slow accept loop lets a
+  // second pool thread wake and take part of a burst of new connections,
+  // which splits the load where one thread alone would keep up.
+  *socketContext = new (std::nothrow) Connection();
 }
 
 MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const char* method,
@@ -238,8 +245,9 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
         MHD_get_connection_info(connection, MHD_CONNECTION_INFO_SOCKET_CONTEXT);
     state = info != nullptr ? static_cast<Connection*>(info->socket_context) : nullptr;
     if (state == nullptr) return MHD_NO;
-    state->started = Clock::now();
+    if (state->client.empty()) state->setClient(connection);
     if (log_.enabled()) {
+      state->started = Clock::now();
       state->method = method;
       state->path = url;
     }
@@ -271,7 +279,13 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
 
   std::vector<RawParameter> query;
   MHD_get_connection_values(connection, MHD_GET_ARGUMENT_KIND, &collectParameter, &query);
-  ws::runtime::Exchange exchange;
+  ws::runtime::Exchange& exchange = threadExchange();
+  // A fresh identifier and empty buffers on every way out, so an identifier
+  // kept by a plug-in past its Run is refused from then on.
+  struct Renew {
+    ws::runtime::Exchange& exchange;
+    ~Renew() { exchange.reset(); }
+  } renew{exchange};
   ws::runtime::ExchangeRequest& request = exchange.request();
   switch (mapUrl(options_.service, url, query, request)) {
     case Mapping::kNotFound:
@@ -313,9 +327,11 @@ MHD_Result HttpServer::runPlugin(MHD_Connection* connection, Connection& state,
 }
 
 void HttpServer::requestDone(Connection& state) {
-  log_.record(state.client, state.method, state.path, state.status, state.bytes,
-              std::chrono::duration_cast<std::chrono::microseconds>(Clock::now() - state.started)
-                  .count());
+  if (log_.enabled()) {
+    log_.record(state.client, state.method, state.path, state.status, state.bytes,
+                std::chrono::duration_cast<std::chrono::microseconds>(Clock::now() - state.started)
+                    .count());
+  }
   state.finish();
   if (inFlight_.fetch_sub(1) == 1 && stopping_) {
     std::lock_guard<std::mutex> lock(drainLock_);
