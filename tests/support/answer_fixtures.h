@@ -1,5 +1,5 @@
 // Test helpers shared by the suites of the answer path: records that free
-// themselves, expected envelopes, scratch directories on disk, and scoped
+// themselves, expected envelopes (envelopes.h), scratch directories on disk, and scoped
 // environment variables.
 #ifndef QUILLON_TESTS_ANSWERS_COMMON_FIXTURES_H_
 #define QUILLON_TESTS_ANSWERS_COMMON_FIXTURES_H_
@@ -15,6 +15,7 @@
 #include <string>
 
 #include "error_record/status.h"
+#include "support/envelopes.h"
 
 namespace answers_test {
 
@@ -39,25 +40,6 @@ inline ::testing::AssertionResult parses(const std::string& text) {
 inline std::string errnoMember(int error) {
   return "\"internal_error\":{\"api\":\"errno\",\"code\":" + std::to_string(error) +
          ",\"string\":\"" + std::strerror(error) + "\"}";
-}
-
-// Envelopes as the client gets them; `record` is quoted the way JSON quotes
-// the texts these tests use (quotes and backslashes only).
-inline std::string quoted(const std::string& text) {
-  std::string out = "\"";
-  for (char c : text) {
-    out += (c == '"' || c == '\\') ? std::string("\\") + c : std::string(1, c);
-  }
-  return out + "\"";
-}
-inline std::string successEnvelope(const std::string& result = "") {
-  const std::string error = "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"}";
-  return error + (result.empty() ? "" : ",\"result\":" + result) + "}";
-}
-inline std::string errorEnvelope(int32_t code, const std::string& text, const std::string& record) {
-  return "{\"error\":{\"success\":" + std::string(code == 0 ? "true" : "false") +
-         ",\"errorCode\":" + std::to_string(code) + ",\"errorText\":" + quoted(text) +
-         (record.empty() ? "" : ",\"errorInfo\":" + quoted(record)) + "}}";
 }
 
 // A fresh directory under the system's temporary directory, removed with
