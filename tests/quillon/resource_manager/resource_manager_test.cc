@@ -1,6 +1,5 @@
 #include "quillon/resource_manager.h"
 
-#include <cJSON.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -9,10 +8,13 @@
 #include <vector>
 
 #include "error_record/error.h"
+#include "support/raised.h"
 
 namespace {
 
 using ::testing::Return;
+using quillon::test_support::Raised;
+using quillon::test_support::raisedBy;
 using ::testing::StrictMock;
 using Uris = std::vector<std::string>;
 
@@ -48,33 +50,11 @@ struct Fixture {
   quillon::ResourceManager manager{helpers, device};
 };
 
-// Parses a thrown record and checks its standard head; returns the debug object.
-struct Record {
-  explicit Record(const koerr::Exception& e) : root(cJSON_Parse(e.what())) {}
-  ~Record() { cJSON_Delete(root); }
-  std::vector<std::string> keys(const cJSON* object) const {
-    std::vector<std::string> out;
-    for (const cJSON* c = object ? object->child : nullptr; c; c = c->next) out.push_back(c->string);
-    return out;
-  }
-  std::string text(const cJSON* object, const char* key) const {
-    const cJSON* item = cJSON_GetObjectItemCaseSensitive(object, key);
-    return cJSON_IsString(item) ? item->valuestring : "<missing>";
-  }
-  cJSON* root;
-};
-
-void expectNotFound(const koerr::Exception& e, int line, const std::vector<std::string>& debugKeys) {
-  EXPECT_EQ(e.code(), -52006);
-  Record r(e);
-  ASSERT_NE(r.root, nullptr) << e.what();
-  EXPECT_EQ(r.keys(r.root), (std::vector<std::string>{"error_constant", "file", "line", "component",
-                                                      "kosyncdomain_debug"}));
-  EXPECT_EQ(r.text(r.root, "error_constant"), "koapalerr_resourceNotFound");
-  EXPECT_EQ(r.text(r.root, "file"), "quillon/ResourceManager");
-  EXPECT_EQ(cJSON_GetObjectItemCaseSensitive(r.root, "line")->valueint, line);
-  EXPECT_EQ(r.text(r.root, "component"), "quillon");
-  EXPECT_EQ(r.keys(cJSON_GetObjectItemCaseSensitive(r.root, "kosyncdomain_debug")), debugKeys);
+// The not-found record raised at `line`, `members` (already JSON) in its debug object.
+std::string notFound(int line, const std::string& members) {
+  return "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/ResourceManager\","
+         "\"line\":" + std::to_string(line) + ",\"component\":\"quillon\",\"kosyncdomain_debug\":{" +
+         members + "}}";
 }
 
 TEST(ResourceListing, EveryFilterAndTimescaleCount) {
@@ -123,15 +103,11 @@ TEST(ResourceListing, DeviceWithoutUriCutsTheDocumentButHelperErrorsStillLeave) 
   EXPECT_CALL(*f.helpers, getTimescaleUris).WillOnce([]() -> Uris {
     koerr::Error(-52004, "jsonErrorsNotAnArray", "x/y", 7, "kosync_debug").add("key", "v").raise();
   });
-  try {
-    (void)f.manager.getResources("");
-    FAIL() << "no error";
-  } catch (const koerr::Exception& e) {
-    EXPECT_EQ(e.code(), -52004);
-    EXPECT_STREQ(e.what(),
-                 "{\"error_constant\":\"jsonErrorsNotAnArray\",\"file\":\"x/y\",\"line\":7,"
-                 "\"component\":\"quillon\",\"kosync_debug\":{\"key\":\"v\"}}");
-  }
+  const Raised raised = raisedBy([&] { (void)f.manager.getResources(""); });
+  EXPECT_EQ(raised.code, -52004);
+  EXPECT_EQ(raised.record,
+            "{\"error_constant\":\"jsonErrorsNotAnArray\",\"file\":\"x/y\",\"line\":7,"
+            "\"component\":\"quillon\",\"kosync_debug\":{\"key\":\"v\"}}");
 }
 
 TEST(DeviceResource, OnlyTheExactUriIsFoundForGetAndPut) {
@@ -151,21 +127,18 @@ TEST(DeviceResource, OnlyTheExactUriIsFoundForGetAndPut) {
     for (int line : {75, 127}) {
       Fixture f;
       EXPECT_CALL(*f.device, getUri).WillRepeatedly(Return(kDevice));
-      try {
+      const Raised raised = raisedBy([&] {
         if (line == 75) {
           (void)f.manager.getSyncableDevice(wrong);
         } else {
           f.manager.putSyncableDevice(wrong, "{}");
         }
-        FAIL() << "found";
-      } catch (const koerr::Exception& e) {
-        expectNotFound(e, line, {"message", "localDeviceUri", "onlyDeviceUri"});
-        Record r(e);
-        const cJSON* debug = cJSON_GetObjectItemCaseSensitive(r.root, "kosyncdomain_debug");
-        EXPECT_EQ(r.text(debug, "message"), "Requested syncableDeviceUri does not exist on this host.");
-        EXPECT_EQ(r.text(debug, "localDeviceUri"), wrong);
-        EXPECT_EQ(r.text(debug, "onlyDeviceUri"), exact);
-      }
+      });
+      EXPECT_EQ(raised.code, -52006);
+      EXPECT_EQ(raised.record,
+                notFound(line, "\"message\":\"Requested syncableDeviceUri does not exist on this "
+                               "host.\",\"localDeviceUri\":\"" + wrong + "\",\"onlyDeviceUri\":\"" +
+                                   exact + "\""));
     }
   }
 }
@@ -205,22 +178,12 @@ TEST(TimescaleResource, UnknownUriListsTheCurrentOnesRaw) {
     SCOPED_TRACE(c.requested);
     Fixture f;
     EXPECT_CALL(*f.helpers, getTimescaleUris).WillOnce(Return(c.current));
-    try {
-      (void)f.manager.getTimescale(c.requested);
-      FAIL() << "found";
-    } catch (const koerr::Exception& e) {
-      expectNotFound(e, 98, {"message", "localTimescaleUri", "currentTimescaleUris"});
-      Record r(e);
-      const cJSON* debug = cJSON_GetObjectItemCaseSensitive(r.root, "kosyncdomain_debug");
-      EXPECT_EQ(r.text(debug, "message"),
-                "Requested timescaleUri does not match any timescaleUri on the system");
-      EXPECT_EQ(r.text(debug, "localTimescaleUri"), c.requested);
-      const cJSON* list = cJSON_GetObjectItemCaseSensitive(debug, "currentTimescaleUris");
-      ASSERT_TRUE(cJSON_IsArray(list));
-      char* printed = cJSON_PrintUnformatted(list);
-      EXPECT_EQ(printed, c.list);
-      cJSON_free(printed);
-    }
+    const Raised raised = raisedBy([&] { (void)f.manager.getTimescale(c.requested); });
+    EXPECT_EQ(raised.code, -52006);
+    EXPECT_EQ(raised.record,
+              notFound(98, "\"message\":\"Requested timescaleUri does not match any timescaleUri on "
+                           "the system\",\"localTimescaleUri\":\"" + c.requested +
+                               "\",\"currentTimescaleUris\":" + c.list));
   }
 }
 
