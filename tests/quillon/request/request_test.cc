@@ -1,6 +1,5 @@
 // quillon::Request against a scripted host: this executable defines the host's
 // C functions itself, so they take precedence over the runtime library's.
-#include <cjson/cJSON.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -10,6 +9,7 @@
 
 #include "error_record/exception.h"
 #include "quillon/request.h"
+#include "support/raised.h"
 #include "ws_runtime/ws_runtime.h"
 
 namespace {
@@ -41,34 +41,12 @@ class MockInfo : public ws::runtime::RequestInfo {
 MockHost* host = nullptr;
 constexpr uint32_t kId = 4711;
 
-// "key=value;" for every member in order, nested objects as "outer.key".
-std::string flatten(const cJSON* node, const std::string& prefix = "") {
-  std::string out;
-  for (const cJSON* item = node->child; item != nullptr; item = item->next) {
-    const std::string key = prefix + item->string;
-    if (cJSON_IsObject(item)) {
-      out += flatten(item, key + ".");
-    } else if (cJSON_IsString(item)) {
-      out += key + "=" + item->valuestring + ";";
-    } else {
-      out += key + "=" + std::to_string(static_cast<long long>(item->valuedouble)) + ";";
-    }
-  }
-  return out;
-}
-
-// The text `call` returns, or "code|members" of the record it throws.
+// The text `call` returns, or "code|record" of the record it throws.
 template <typename Call>
 std::string outcomeOf(Call call) {
-  try {
-    return call();
-  } catch (const koerr::Exception& error) {
-    cJSON* root = cJSON_Parse(error.what());
-    if (root == nullptr) return std::string("unparsable: ") + error.what();
-    std::string text = std::to_string(error.code()) + "|" + flatten(root);
-    cJSON_Delete(root);
-    return text;
-  }
+  std::string text;
+  const auto raised = quillon::test_support::raisedBy([&] { text = call(); });
+  return raised.code == 0 ? text : std::to_string(raised.code) + "|" + raised.record;
 }
 
 template <typename Call>
@@ -79,16 +57,19 @@ std::string recordOf(Call call) {
   });
 }
 
+std::string record(int32_t code, const char* constant, int line, const std::string& debug) {
+  return std::to_string(code) + "|{\"error_constant\":\"" + constant +
+         "\",\"file\":\"quillon/Request\",\"line\":" + std::to_string(line) +
+         ",\"component\":\"quillon\",\"quillon_debug\":{" + debug + "}}";
+}
+
 std::string hostFailure(int32_t code, int line, const std::string& function) {
-  return std::to_string(code) + "|error_constant=returnValue;file=quillon/Request;line=" +
-         std::to_string(line) + ";component=quillon;quillon_debug.function=" + function +
-         ";quillon_debug.returnValue=" + std::to_string(code) + ";";
+  return record(code, "returnValue", line,
+                "\"function\":\"" + function + "\",\"returnValue\":" + std::to_string(code));
 }
 
 std::string checkFailure(int32_t code, const char* constant, int line, const char* condition) {
-  return std::to_string(code) + "|error_constant=" + constant +
-         ";file=quillon/Request;line=" + std::to_string(line) +
-         ";component=quillon;quillon_debug.check failed=" + condition + ";";
+  return record(code, constant, line, std::string("\"check failed\":\"") + condition + "\"");
 }
 
 class RequestTest : public ::testing::Test {
@@ -164,9 +145,7 @@ TEST_F(RequestTest, MediaTypesAcceptMissingHeadersAndReportOtherFailures) {
     EXPECT_EQ((request.*r.read)(), "");
     answerVariable(r.variable, 128, codes::k_BUFFERTOOSMALL, nullptr, 300);
     EXPECT_EQ(recordOf([&] { (request.*r.read)(); }),
-              std::to_string(codes::k_BUFFERTOOSMALL) +
-                  "|error_constant=error;file=quillon/Request;line=" + std::to_string(r.line) +
-                  ";component=quillon;quillon_debug.check failed=" + condition + ";");
+              checkFailure(codes::k_BUFFERTOOSMALL, "error", r.line, condition));
   }
 }
 
