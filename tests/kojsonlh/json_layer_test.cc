@@ -10,16 +10,13 @@
 #include "kojsonlh/cjson_utils.h"
 #include "kojsonlh/cpp_json.h"
 #include "kosynctools_cjson/json_helper_functions.h"
+#include "support/raised.h"
 
 namespace {
 
 std::string thrownBy(const std::function<void()>& call) {
-  try {
-    call();
-  } catch (const koerr::Exception& e) {
-    return std::to_string(e.code()) + " " + e.what();
-  }
-  return "<nothing thrown>";
+  const auto raised = quillon::test_support::raisedBy(call);
+  return std::to_string(raised.code) + " " + raised.record;
 }
 
 std::string headOnly(int code, const char* constant, const char* file, int line) {

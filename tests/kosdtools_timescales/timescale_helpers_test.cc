@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "error_record/error.h"
+#include "support/raised.h"
 
 namespace {
 
@@ -89,12 +90,7 @@ std::string nestedServiceError(int32_t code) {
 }
 
 std::string thrownBy(const std::function<void()>& call) {
-  try {
-    call();
-  } catch (const koerr::Exception& e) {
-    return e.what();
-  }
-  return "<nothing thrown>";
+  return quillon::test_support::raisedBy(call).record;
 }
 
 TEST(TimescaleHelpers, OrdersBoundaryClocksAndTheSelectedSlaveFirstAndMastersLast) {

@@ -3,9 +3,11 @@
 #include <cJSON.h>
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <string>
 
 #include "error_record/exception.h"
+#include "support/raised.h"
 #include "syncable_device/syncable_device_actual.h"
 
 namespace {
@@ -20,12 +22,15 @@ std::string document(const std::string& requirements, bool coherent) {
          ",\"offsetNanos\":250}";
 }
 
-std::string debugMessage(const koerr::Exception& e) {
-  cJSON* root = cJSON_Parse(e.what());
+// "code constant: message" of the record `call` raises.
+std::string failure(const std::function<void()>& call) {
+  const auto raised = quillon::test_support::raisedBy(call);
+  cJSON* root = cJSON_Parse(raised.record.c_str());
   const cJSON* debug = cJSON_GetObjectItemCaseSensitive(root, "kosdlib_debug");
   const cJSON* message = cJSON_GetObjectItemCaseSensitive(debug, "message");
   const cJSON* constant = cJSON_GetObjectItemCaseSensitive(root, "error_constant");
-  std::string out = std::string(cJSON_IsString(constant) ? constant->valuestring : "?") + ": " +
+  std::string out = std::to_string(raised.code) + " " +
+                    (cJSON_IsString(constant) ? constant->valuestring : "?") + ": " +
                     (cJSON_IsString(message) ? message->valuestring : "?");
   cJSON_Delete(root);
   return out;
@@ -69,25 +74,15 @@ TEST(SyncableDevice, BadRequirementsFailWithTheLibraryRecordAndKeepTheOldOnes) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.text);
-    try {
-      device.setCoherencyRequirements(c.text, "");
-      FAIL() << "accepted";
-    } catch (const koerr::Exception& e) {
-      EXPECT_EQ(e.code(), -52005);
-      EXPECT_EQ(debugMessage(e), std::string("koapalerr_invalidParameter: ") + c.message);
-    }
+    EXPECT_EQ(failure([&] { device.setCoherencyRequirements(c.text, ""); }),
+              std::string("-52005 koapalerr_invalidParameter: ") + c.message);
     EXPECT_EQ(device.toJson(), document("{\"maxOffsetNanos\":1000}", true));
   }
 }
 
 TEST(SyncableDevice, CreationFailureThrowsAndUrisAreEscapedInTheDocument) {
-  try {
-    SyncableDeviceActual device("");
-    FAIL() << "created";
-  } catch (const koerr::Exception& e) {
-    EXPECT_EQ(e.code(), -52005);
-    EXPECT_EQ(debugMessage(e), "koapalerr_invalidParameter: The device URI is missing or empty.");
-  }
+  EXPECT_EQ(failure([] { SyncableDeviceActual device(""); }),
+            "-52005 koapalerr_invalidParameter: The device URI is missing or empty.");
   SyncableDeviceActual odd("/a\"b\\c\x01");
   EXPECT_STREQ(odd.getUri(), "/a\"b\\c\x01");
   cJSON* root = cJSON_Parse(odd.toJson().c_str());
