@@ -20,10 +20,13 @@
 #include "kopdm_clientapi.h"
 #include "kopdm_clientapi/api_wrapper.h"
 #include "kosdtools_timescales/timescale_helpers.h"
+#include "support/raised.h"
 
 namespace {
 
 using Strings = std::vector<std::string>;
+using quillon::test_support::Raised;
+using quillon::test_support::raisedBy;
 
 // The scenario the stand-in of this process serves. KOPDM_SIM_SCENARIO is set
 // before main() runs, so the stand-in's first call already reads it; it
@@ -114,20 +117,6 @@ struct Record {
   cJSON* root;
 };
 
-// What `call` raised: the code and the record (code 0 when nothing was thrown).
-struct Raised {
-  int32_t code = 0;
-  std::string record = "<nothing thrown>";
-};
-Raised raisedBy(const std::function<void()>& call) {
-  try {
-    call();
-  } catch (const koerr::Exception& e) {
-    return {e.code(), e.what()};
-  }
-  return {};
-}
-
 // The message of the record every call fails with while the scenario is
 // unusable, checking the record's code and file name on the way.
 std::string unusableBecause(kopendulo::ApiWrapper& wrapper) {
@@ -145,22 +134,6 @@ class AgainstStandIn : public ::testing::Test {
   std::shared_ptr<kopendulo::ApiWrapper> wrapper = std::make_shared<kopendulo::ApiWrapper>();
   kosdtools::pendulo::TimescaleHelpers helpers{wrapper};
 };
-
-TEST_F(AgainstStandIn, PublishesUsableTimeReferencesInPriorityOrder) {
-  install(kFourTrs);
-  EXPECT_EQ(helpers.getTimescaleUris(),
-            (Strings{"/quillon/timescales/pendulo/bc2/gm-b",
-                     "/quillon/timescales/pendulo/slave-1/gm-s",
-                     "/quillon/timescales/pendulo/master0/gm-m"}));
-  EXPECT_EQ(helpers.getFirstTrTimescaleUri(), "/quillon/timescales/pendulo/master0/gm-m");
-  int64_t offset = 0;
-  EXPECT_EQ(wrapper->getSelectedTrOffsetNanos(&offset), 0);
-  EXPECT_EQ(offset, -1500);
-  EXPECT_EQ(wrapper->getApiVersion(), 1);
-  std::string metadata = "unchanged";
-  wrapper->getTrMetadataJson("bc2", &metadata);
-  EXPECT_EQ(metadata, "{}");
-}
 
 TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
   const std::string longText(1023 - std::string("{\"t\":\"\"}").size(), 'x');
@@ -254,8 +227,13 @@ TEST_F(AgainstStandIn, SelectedTrIdsUpTo255CharactersArriveWhole) {
   EXPECT_TRUE(helpers.getTrIds().empty());
 }
 
+// The priority order of the published list is checked end to end over HTTP.
 TEST_F(AgainstStandIn, StateChangingCallsActOnTheServedState) {
   install(kFourTrs);
+  EXPECT_EQ(wrapper->getApiVersion(), 1);
+  std::string metadata = "unchanged";
+  wrapper->getTrMetadataJson("bc2", &metadata);
+  EXPECT_EQ(metadata, "{}");
   wrapper->setTrAttr("idle3", "portState", "PTP_DISABLED");
   wrapper->setTrAttr("idle3", "domainNumber", "24");
   std::string answer;
@@ -274,7 +252,7 @@ TEST_F(AgainstStandIn, StateChangingCallsActOnTheServedState) {
 
   EXPECT_EQ(wrapper->adjustTime(2, -500), 0);
   int64_t offset = 0;
-  wrapper->getSelectedTrOffsetNanos(&offset);
+  EXPECT_EQ(wrapper->getSelectedTrOffsetNanos(&offset), 0);
   EXPECT_EQ(offset, 2 * 1000000000LL - 500 - 1500);
 
   wrapper->bringDownService();
