@@ -103,6 +103,31 @@ TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
   EXPECT_EQ(host.process().stop(), 0);
 }
 
+TEST(ServiceOverHttp, RefusalsCarryTheSuccessEnvelopeAndHostReadFailuresTheRawRecord) {
+  ServiceHost host(scenario({}));
+  struct Case {
+    const char* name;
+    std::string target;
+    test::HeaderList headers;
+    int status;
+  } cases[] = {
+      {"unknown command", "/quillon/clocks", {}, 404},
+      {"Accept of another type only", kDeviceUri, {{"Accept", "text/html"}}, 415},
+      {"Content-Type of another type", kDeviceUri, {{"Content-Type", "application/json"}}, 415},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.name);
+    expectAnswer(host.get(c.target, c.headers), c.status, successEnvelope());
+  }
+  // An unsupported method fails the host read: the raw record, no envelope.
+  const test::HttpResponse post = test::httpRequest(host.port(), "POST", "/quillon/resources", {}, "{}");
+  EXPECT_EQ(post.status, 500);
+  EXPECT_EQ(post.body,
+            "{\"error_constant\":\"kInvalidRequestMethodType\",\"file\":\"quillon/Request\","
+            "\"line\":72,\"component\":\"quillon\",\"quillon_debug\":{\"check failed\":\"false\"}}");
+  EXPECT_EQ(host.process().stop(), 0);
+}
+
 TEST(ServiceOverHttp, NoTimescalesAndEditsWhileRunning) {
   ServiceHost host(scenario({}));
   const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";

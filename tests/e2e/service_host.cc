@@ -11,26 +11,18 @@
 namespace e2e {
 
 namespace test = quillon::test_support;
-
-std::string jsonString(const std::string& text) {
-  std::string out = "\"";
-  for (char c : text) {
-    if (c == '"' || c == '\\') out += '\\';
-    out += c;
-  }
-  return out + "\"";
-}
+using answers_test::quoted;
 
 std::string scenario(const std::vector<Tr>& trs, const std::string& selected,
                      const std::string& extra) {
   std::string out = "{\"apiVersion\":1,\"selectedTrId\":";
-  out += selected.empty() ? "null" : jsonString(selected);
+  out += selected.empty() ? "null" : quoted(selected);
   out += ",\"trs\":{";
   for (std::size_t i = 0; i < trs.size(); ++i) {
     if (i) out += ',';
-    out += jsonString(trs[i].id) + ":{\"attrs\":{\"type\":" + jsonString(trs[i].type) +
-           ",\"gmClockId\":" + jsonString(trs[i].gmClockId) +
-           ",\"portState\":" + jsonString(trs[i].portState) + "}}";
+    out += quoted(trs[i].id) + ":{\"attrs\":{\"type\":" + quoted(trs[i].type) +
+           ",\"gmClockId\":" + quoted(trs[i].gmClockId) +
+           ",\"portState\":" + quoted(trs[i].portState) + "}}";
   }
   out += "}";
   if (!extra.empty()) out += "," + extra;
@@ -85,17 +77,6 @@ test::HttpResponse ServiceHost::get(const std::string& target, const test::Heade
 test::HttpResponse ServiceHost::put(const std::string& target, const std::string& body,
                                     const test::HeaderList& headers) {
   return test::httpRequest(port(), "PUT", target, headers, body);
-}
-
-std::string successEnvelope(const std::string& result) {
-  std::string out = "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"}";
-  if (!result.empty()) out += ",\"result\":" + result;
-  return out + "}";
-}
-
-std::string errorEnvelope(int32_t code, const std::string& explanation, const std::string& record) {
-  return "{\"error\":{\"success\":false,\"errorCode\":" + std::to_string(code) +
-         ",\"errorText\":" + jsonString(explanation) + ",\"errorInfo\":" + jsonString(record) + "}}";
 }
 
 std::string deviceDocument(const std::string& requirements, bool coherent) {

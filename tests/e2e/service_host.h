@@ -12,10 +12,14 @@
 #include <string>
 #include <vector>
 
+#include "support/envelopes.h"
 #include "support/host_process.h"
 #include "support/http_client.h"
 
 namespace e2e {
+
+using answers_test::errorEnvelope;
+using answers_test::successEnvelope;
 
 inline constexpr const char* kMediaType = "vnd.ko.syncDomain.v0/json; charset=utf-8";
 inline constexpr const char* kDeviceUri = "/quillon/syncableDevices/pendulo/timekeeper/genericTk";
@@ -57,16 +61,11 @@ class ServiceHost {
   std::unique_ptr<quillon::test_support::HostProcess> host_;
 };
 
-// The envelopes, byte for byte.
-std::string successEnvelope(const std::string& result);
-std::string errorEnvelope(int32_t code, const std::string& explanation, const std::string& record);
 // The device library's document of the local time keeper.
 std::string deviceDocument(const std::string& requirements, bool coherent);
 // The resource manager's not-found record raised at `line`, with `members`
 // (already JSON) after its message.
 std::string notFoundRecord(int line, const std::string& message, const std::string& members);
-// The text as a JSON string, quotes included.
-std::string jsonString(const std::string& text);
 // The explanation of `code` in the shipped English explanations file: the
 // lines between the entry's tags, line ends included.
 std::string shippedExplanation(int32_t code);
