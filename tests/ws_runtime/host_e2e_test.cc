@@ -136,31 +136,6 @@ TEST(HostEndToEnd, RefusesALargeBodyWithoutThePluginAndKeepsServing) {
   EXPECT_EQ(host.stop(), 0);
 }
 
-TEST(HostEndToEnd, ConcurrentClientsEachGetTheirOwnAnswers) {
-  HostProcess host(echoArgs({"--threads", "3", "--quiet"}));
-  constexpr int kClients = 4;
-  constexpr int kRequests = 50;
-  std::vector<std::future<int>> clients;
-  for (int c = 0; c < kClients; ++c) {
-    clients.push_back(std::async(std::launch::async, [&host, c] {
-      HttpClient client(host.port());
-      int wrong = 0;
-      for (int i = 0; i < kRequests; ++i) {
-        const std::string mine = std::to_string(c) + "-" + std::to_string(i);
-        const HttpResponse answer =
-            client.send(HttpRequest{"PUT", "/echo/echo/p/t/" + mine, {}, mine});
-        if (answer.body.find("name=" + mine + "\n") == std::string::npos ||
-            answer.body.find("body=" + mine + "\n") == std::string::npos) {
-          ++wrong;
-        }
-      }
-      return wrong;
-    }));
-  }
-  for (auto& client : clients) EXPECT_EQ(client.get(), 0);
-  EXPECT_EQ(host.stop(), 0);
-}
-
 TEST(HostEndToEnd, StartUpFailuresNameTheirCause) {
   HostProcess holder(echoArgs({"--quiet"}));  // takes the address of the last case
   const std::string busy = "127.0.0.1:" + std::to_string(holder.port());
