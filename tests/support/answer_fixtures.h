@@ -1,21 +1,18 @@
 // Test helpers shared by the suites of the answer path: records that free
-// themselves, expected envelopes (envelopes.h), scratch directories on disk, and scoped
-// environment variables.
+// themselves, plus expected envelopes (envelopes.h), scratch directories and
+// scoped environment variables (scratch.h).
 #ifndef QUILLON_TESTS_ANSWERS_COMMON_FIXTURES_H_
 #define QUILLON_TESTS_ANSWERS_COMMON_FIXTURES_H_
 
 #include <cjson/cJSON.h>
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
 #include <cstring>
-#include <filesystem>
-#include <fstream>
-#include <optional>
 #include <string>
 
 #include "error_record/status.h"
 #include "support/envelopes.h"
+#include "support/scratch.h"
 
 namespace answers_test {
 
@@ -41,57 +38,6 @@ inline std::string errnoMember(int error) {
   return "\"internal_error\":{\"api\":\"errno\",\"code\":" + std::to_string(error) +
          ",\"string\":\"" + std::strerror(error) + "\"}";
 }
-
-// A fresh directory under the system's temporary directory, removed with
-// everything in it at the end of the scope.
-class ScratchDir {
- public:
-  ScratchDir() {
-    std::string pattern = (std::filesystem::temp_directory_path() / "answers-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr) {
-      ADD_FAILURE() << "mkdtemp failed";
-    }
-    path_ = pattern;
-  }
-  ~ScratchDir() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-  }
-  ScratchDir(const ScratchDir&) = delete;
-  ScratchDir& operator=(const ScratchDir&) = delete;
-
-  const std::filesystem::path& path() const { return path_; }
-  std::string str() const { return path_.string(); }
-
-  // Writes `content` byte for byte to `relative`, creating its directories.
-  std::string write(const std::string& relative, const std::string& content) const {
-    const std::filesystem::path file = path_ / relative;
-    std::filesystem::create_directories(file.parent_path());
-    std::ofstream(file, std::ios::binary) << content;
-    return file.string();
-  }
-
- private:
-  std::filesystem::path path_;
-};
-
-// Sets (or, with nullopt, unsets) a variable and restores it afterwards.
-class ScopedEnv {
- public:
-  ScopedEnv(const char* name, std::optional<std::string> value) : name_(name) {
-    if (const char* old = getenv(name)) {
-      old_ = old;
-    }
-    value ? setenv(name, value->c_str(), 1) : unsetenv(name);
-  }
-  ~ScopedEnv() { old_ ? setenv(name_, old_->c_str(), 1) : unsetenv(name_); }
-  ScopedEnv(const ScopedEnv&) = delete;
-  ScopedEnv& operator=(const ScopedEnv&) = delete;
-
- private:
-  const char* name_;
-  std::optional<std::string> old_;
-};
 
 }  // namespace answers_test
 
