@@ -186,29 +186,27 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
 // What a failing time service makes of a listing: the helpers' record, with
 // the service's own nested inside where it was replaced.
 TEST(ServiceOverHttp, TimeServiceErrorsReachTheClientAsTheirEnvelope) {
-  const std::string trs = scenario({kMixed[0], kMixed[2]});
-  const std::string body = trs.substr(0, trs.size() - 1);
   struct Case {
-    std::string scenarioText;
+    std::string fault;
     int32_t code;
     std::string constant;
     int line;
     std::string message;
     int32_t nestedCode;  // 0: none
   } cases[] = {
-      {body + ",\"faults\":[{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"code\":-1074100990}]}",
+      {"{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"code\":-1074100990}",
        -52006, "koapalerr_resourceNotFound", 182,
        "Pendulo does not have the specified attr; maybe the target is running an older version of Pendulo.",
        -1074100990},
-      {body + ",\"faults\":[{\"call\":\"getTrAttrJson\",\"trId\":\"tr2\",\"key\":\"type\",\"code\":-1074100991}]}",
+      {"{\"call\":\"getTrAttrJson\",\"trId\":\"tr2\",\"key\":\"type\",\"code\":-1074100991}",
        -52006, "koapalerr_resourceNotFound", 221, "The specified Pendulo Time Reference does not exist.",
        -1074100991},
-      {body + ",\"faults\":[{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"answer\":\"not json\"}]}",
+      {"{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"answer\":\"not json\"}",
        -52005, "koapalerr_invalidParameter", 193, "Failed to parse TR IDs from TR list JSON.", 0},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.message);
-    ServiceHost host(c.scenarioText);
+    ServiceHost host(scenario({kMixed[0], kMixed[2]}, "", "\"faults\":[" + c.fault + "]"));
     for (const std::string& target : {std::string("/quillon/resources"), kMixedUris[1]}) {
       SCOPED_TRACE(target);
       const test::HttpResponse r = host.get(target);

@@ -1,8 +1,5 @@
 #include "e2e/service_host.h"
 
-#include <stdlib.h>
-#include <unistd.h>
-
 #include <cstdio>
 #include <fstream>
 #include <iterator>
@@ -29,42 +26,16 @@ std::string scenario(const std::vector<Tr>& trs, const std::string& selected,
   return out + "}";
 }
 
-namespace {
-
-void writeFile(const std::string& path, const std::string& text) {
-  std::ofstream file(path, std::ios::binary | std::ios::trunc);
-  file << text;
-  if (!file.flush()) throw std::runtime_error("cannot write " + path);
-}
-
-}  // namespace
-
-ServiceHost::ServiceHost(const std::string& scenarioText, const std::vector<std::string>& extraArgs) {
-  char dir[] = "/tmp/quillon-e2e-XXXXXX";
-  if (mkdtemp(dir) == nullptr) throw std::runtime_error("mkdtemp failed");
-  directory_ = dir;
-  scenarioPath_ = directory_ + "/scenario.json";
-  writeFile(scenarioPath_, scenarioText);
-  const std::string marker = directory_ + "/share.dir";
-  writeFile(marker, QUILLON_SHARE_DIR);
-  std::vector<std::string> args = {"--plugin", test::kQuillonPluginPath, "--quiet"};
-  args.insert(args.end(), extraArgs.begin(), extraArgs.end());
+ServiceHost::ServiceHost(const std::string& scenarioText)
+    : scenarioPath_(directory_.write("scenario.json", scenarioText)) {
+  const std::string marker = directory_.write("share.dir", QUILLON_SHARE_DIR);
   host_ = std::make_unique<test::HostProcess>(
-      args, test::Environment{{"KOPDM_SIM_SCENARIO", scenarioPath_},
-                              {"KOSYSQ_SHARE_DIR_FILE", marker}});
-}
-
-ServiceHost::~ServiceHost() {
-  host_.reset();
-  std::remove(scenarioPath_.c_str());
-  std::remove((directory_ + "/share.dir").c_str());
-  std::remove((directory_ + "/next.json").c_str());
-  rmdir(directory_.c_str());
+      std::vector<std::string>{"--plugin", test::kQuillonPluginPath, "--quiet"},
+      test::Environment{{"KOPDM_SIM_SCENARIO", scenarioPath_}, {"KOSYSQ_SHARE_DIR_FILE", marker}});
 }
 
 void ServiceHost::writeScenario(const std::string& text) {
-  const std::string next = directory_ + "/next.json";
-  writeFile(next, text);
+  const std::string next = directory_.write("next.json", text);
   if (std::rename(next.c_str(), scenarioPath_.c_str()) != 0) {
     throw std::runtime_error("cannot replace " + scenarioPath_);
   }

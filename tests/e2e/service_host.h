@@ -15,6 +15,7 @@
 #include "support/envelopes.h"
 #include "support/host_process.h"
 #include "support/http_client.h"
+#include "support/scratch.h"
 
 namespace e2e {
 
@@ -39,9 +40,7 @@ std::string scenario(const std::vector<Tr>& trs, const std::string& selected = "
 
 class ServiceHost {
  public:
-  explicit ServiceHost(const std::string& scenarioText,
-                       const std::vector<std::string>& extraArgs = {});
-  ~ServiceHost();
+  explicit ServiceHost(const std::string& scenarioText);
   ServiceHost(const ServiceHost&) = delete;
   ServiceHost& operator=(const ServiceHost&) = delete;
 
@@ -56,7 +55,7 @@ class ServiceHost {
                                           const quillon::test_support::HeaderList& headers = {});
 
  private:
-  std::string directory_;
+  answers_test::ScratchDir directory_;  // outlives the host
   std::string scenarioPath_;
   std::unique_ptr<quillon::test_support::HostProcess> host_;
 };

@@ -3,7 +3,6 @@
 #include <cjson/cJSON.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>
-#include <unistd.h>
 
 #include <chrono>
 #include <cstdio>
@@ -21,6 +20,7 @@
 #include "kopdm_clientapi/api_wrapper.h"
 #include "kosdtools_timescales/timescale_helpers.h"
 #include "support/raised.h"
+#include "support/scratch.h"
 
 namespace {
 
@@ -31,22 +31,12 @@ using quillon::test_support::raisedBy;
 // The scenario the stand-in of this process serves. KOPDM_SIM_SCENARIO is set
 // before main() runs, so the stand-in's first call already reads it; it
 // notices rewrites on its own watch thread.
-std::string makeScenarioPath() {
-  char dir[] = "/tmp/kopdm_sim_test_XXXXXX";
-  if (mkdtemp(dir) == nullptr) std::abort();
-  const std::string path = std::string(dir) + "/scenario.json";
+const answers_test::ScratchDir kScenarioDir;
+const std::string kScenario = [] {
+  const std::string path = kScenarioDir.file("scenario.json");
   setenv("KOPDM_SIM_SCENARIO", path.c_str(), 1);
   return path;
-}
-const std::string kScenario = makeScenarioPath();
-
-struct RemoveScenario : ::testing::Environment {
-  void TearDown() override {
-    std::remove(kScenario.c_str());
-    rmdir(kScenario.substr(0, kScenario.rfind('/')).c_str());
-  }
-};
-::testing::Environment* const kCleanup = ::testing::AddGlobalTestEnvironment(new RemoveScenario);
+}();
 
 // True once `condition` holds, false when it did not within ten seconds.
 bool eventually(const std::function<bool()>& condition) {

@@ -4,16 +4,14 @@
 #include <unistd.h>
 
 #include <csignal>
-#include <filesystem>
-#include <fstream>
 #include <future>
-#include <iterator>
 #include <string>
 
 #include <gtest/gtest.h>
 
 #include "support/host_process.h"
 #include "support/http_client.h"
+#include "support/scratch.h"
 
 namespace {
 
@@ -21,20 +19,7 @@ using quillon::test_support::HostProcess;
 using quillon::test_support::HttpClient;
 using quillon::test_support::HttpRequest;
 using quillon::test_support::HttpResponse;
-
-// A scratch directory for the plug-in's log and gate, removed afterwards.
-struct Scratch {
-  const std::string dir = [] {
-    char pattern[] = "/tmp/ws-runtime-e2e-XXXXXX";
-    return std::string(::mkdtemp(pattern));
-  }();
-  ~Scratch() { std::filesystem::remove_all(dir); }
-  std::string file(const char* name) const { return dir + "/" + name; }
-  std::string read(const char* name) const {
-    std::ifstream in(file(name));
-    return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
-  }
-};
+using Scratch = answers_test::ScratchDir;
 
 std::vector<std::string> echoArgs(std::vector<std::string> extra = {}) {
   std::vector<std::string> args = {"--plugin", ECHO_PLUGIN_PATH, "--service", "echo"};

@@ -1,9 +1,6 @@
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <cerrno>
-#include <filesystem>
-#include <fstream>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -12,6 +9,7 @@
 #include "ko/dsc/osdep/realtime_kernel.h"
 #include "ko/dsc/osdep/recursive_mutex.h"
 #include "ko/dsc/osdep/sleep.h"
+#include "support/scratch.h"
 
 namespace ko::dsc::osdep {
 namespace {
@@ -21,13 +19,9 @@ struct FlagFile {
   explicit FlagFile(const char* content) {
     if (content != nullptr) write(content);
   }
-  ~FlagFile() { std::filesystem::remove_all(dir); }
-  void write(const std::string& content) const { std::ofstream(path) << content; }
-  const std::string dir = [] {
-    char pattern[] = "/tmp/ko_dsc_rt_XXXXXX";
-    return std::string(mkdtemp(pattern));
-  }();
-  const std::string path = dir + "/realtime";
+  void write(const std::string& content) const { dir.write("realtime", content); }
+  const answers_test::ScratchDir dir;
+  const std::string path = dir.file("realtime");
 };
 
 TEST(RealtimeKernel, OnlyALeadingOneMeansRealtimeAndTheAnswerIsReadOnce) {

@@ -2,26 +2,22 @@
 
 #include <gtest/gtest.h>
 #include <stdlib.h>
-#include <unistd.h>
 
 #include <cmath>
-#include <cstdio>
-#include <filesystem>
 #include <string>
 
 #include "ko/dsc/osdep/os_exception.h"
+#include "support/scratch.h"
 
 namespace ko::dsc::osdep {
 namespace {
 
 TEST(LibrarySearchPath, ComponentFolderFirstThenDirectoryThenTheSystemLoader) {
-  char base[] = "/tmp/ko_dsc_lib_XXXXXX";
-  const std::string dir = mkdtemp(base);
+  const answers_test::ScratchDir scratch;
+  const std::string dir = scratch.str();
   const std::string other = dir + "/other";
-  std::filesystem::create_directories(other + "/kocurl");
-  auto touch = [](const std::string& path) { std::fclose(std::fopen(path.c_str(), "w")); };
-  touch(dir + "/libx.so.13");
-  touch(other + "/kocurl/libx.so.13");
+  scratch.write("libx.so.13", "");
+  scratch.write("other/kocurl/libx.so.13", "");
 
   const LibrarySearchPath path({dir + "/missing", other, dir});
   EXPECT_EQ(path.locate("kocurl", "libx.so.13"), other + "/kocurl/libx.so.13");
@@ -33,8 +29,6 @@ TEST(LibrarySearchPath, ComponentFolderFirstThenDirectoryThenTheSystemLoader) {
             other + "/kocurl/libx.so.13");
   unsetenv(LibrarySearchPath::kVariable);
   EXPECT_EQ(LibrarySearchPath::fromEnvironment().locate("kocurl", "libx.so.13"), "libx.so.13");
-
-  std::filesystem::remove_all(dir);
 }
 
 TEST(SharedLibrary, ResolvesSymbolsAndRaisesOSExceptionWithTheLoaderText) {
