@@ -6,10 +6,7 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
-#include <fstream>
-#include <iterator>
 #include <map>
 #include <stdexcept>
 #include <thread>
@@ -24,21 +21,7 @@ using Clock = std::chrono::steady_clock;
 constexpr auto kPollInterval = std::chrono::milliseconds(5);
 constexpr auto kStartTimeout = std::chrono::seconds(30);
 constexpr const char* kListeningMarker = "listening on ";
-
-std::string readFile(const std::string& path) {
-  std::ifstream in(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
-}
-
-std::string makeLogFile() {
-  const char* dir = std::getenv("TMPDIR");
-  std::string path = std::string(dir != nullptr && *dir != '\0' ? dir : "/tmp") +
-                     "/ws-runtime-test-XXXXXX";
-  const int fd = ::mkstemp(path.data());
-  if (fd < 0) throw std::runtime_error("mkstemp: " + std::string(std::strerror(errno)));
-  ::close(fd);
-  return path;
-}
+constexpr const char* kLogName = "host.log";
 
 int decodeWaitStatus(int status) {
   if (WIFEXITED(status)) return WEXITSTATUS(status);
@@ -101,27 +84,23 @@ uint16_t announcedPort(const std::string& log) {
 
 }  // namespace
 
-HostProcess::HostProcess(const std::vector<std::string>& args, const Environment& env)
-    : logPath_(makeLogFile()) {
+HostProcess::HostProcess(const std::vector<std::string>& args, const Environment& env) {
   std::vector<std::string> argv = {kWsRuntimePath, "--listen", "127.0.0.1:0"};
   argv.insert(argv.end(), args.begin(), args.end());
-  pid_ = spawn(argv, env, logPath_);
+  pid_ = spawn(argv, env, scratch_.file(kLogName));
   const auto deadline = Clock::now() + kStartTimeout;
   while (port_ == 0) {
     int status = 0;
     if (::waitpid(pid_, &status, WNOHANG) == pid_) {
       exitCode_ = decodeWaitStatus(status);
       pid_ = -1;
-      const std::string text = log();
-      ::unlink(logPath_.c_str());
       throw std::runtime_error("ws-runtime exited with " + std::to_string(exitCode_) +
-                               " before serving:\n" + text);
+                               " before serving:\n" + log());
     }
     port_ = announcedPort(log());
     if (port_ == 0 && Clock::now() > deadline) {
       const std::string text = log();
       stop(SIGKILL);
-      ::unlink(logPath_.c_str());
       throw std::runtime_error("ws-runtime did not come up within 30 s:\n" + text);
     }
     if (port_ == 0) std::this_thread::sleep_for(kPollInterval);
@@ -130,7 +109,6 @@ HostProcess::HostProcess(const std::vector<std::string>& args, const Environment
 
 HostProcess::~HostProcess() {
   if (pid_ > 0) stop(SIGKILL);
-  ::unlink(logPath_.c_str());
 }
 
 void HostProcess::signal(int signal) {
@@ -152,7 +130,7 @@ int HostProcess::stop(int signal) {
   return wait();
 }
 
-std::string HostProcess::log() const { return readFile(logPath_); }
+std::string HostProcess::log() const { return scratch_.read(kLogName); }
 
 bool HostProcess::waitForLog(const std::string& text, std::chrono::milliseconds timeout) const {
   const auto deadline = Clock::now() + timeout;
@@ -165,18 +143,16 @@ bool HostProcess::waitForLog(const std::string& text, std::chrono::milliseconds 
 
 HostRun runHostToExit(const std::vector<std::string>& args, const Environment& env,
                       std::chrono::milliseconds timeout) {
-  const std::string logPath = makeLogFile();
+  const answers_test::ScratchDir scratch;
   std::vector<std::string> argv = {kWsRuntimePath};
   argv.insert(argv.end(), args.begin(), args.end());
-  const pid_t pid = spawn(argv, env, logPath);
+  const pid_t pid = spawn(argv, env, scratch.file(kLogName));
   int status = 0;
   for (const auto deadline = Clock::now() + timeout; ::waitpid(pid, &status, WNOHANG) != pid;) {
     if (Clock::now() > deadline) ::kill(pid, SIGKILL);  // reaped on the next turn
     std::this_thread::sleep_for(kPollInterval);
   }
-  HostRun run{decodeWaitStatus(status), readFile(logPath)};
-  ::unlink(logPath.c_str());
-  return run;
+  return {decodeWaitStatus(status), scratch.read(kLogName)};
 }
 
 }  // namespace quillon::test_support

@@ -20,6 +20,8 @@
 #include <utility>
 #include <vector>
 
+#include "support/scratch.h"
+
 namespace quillon::test_support {
 
 // The built binaries.
@@ -37,7 +39,7 @@ class HostProcess {
   // Returns once the host accepts connections. Throws std::runtime_error,
   // carrying the host's log, when it exits or is not up within 30 s.
   explicit HostProcess(const std::vector<std::string>& args, const Environment& env = {});
-  // Kills the host if it still runs, and removes the log file.
+  // Kills the host if it still runs, and removes its log.
   ~HostProcess();
   HostProcess(const HostProcess&) = delete;
   HostProcess& operator=(const HostProcess&) = delete;
@@ -61,7 +63,7 @@ class HostProcess {
  private:
   pid_t pid_ = -1;
   uint16_t port_ = 0;
-  std::string logPath_;
+  answers_test::ScratchDir scratch_;  // holds the log
   int exitCode_ = -1;
 };
 
