@@ -1,5 +1,6 @@
-// The built libquillon.so.1 as a host loads it: its exports, its lifecycle
-// over the platform stand-ins, and one request through ws-runtime.
+// The built libquillon.so.1 as a host loads it: its exports and its lifecycle
+// over the platform stand-ins. Served by ws-runtime without flags, it is the
+// host's default plug-in (RealTransfer.ExampleClientListsThePluginsResources).
 #include <dlfcn.h>
 
 #include <gtest/gtest.h>
@@ -7,7 +8,6 @@
 #include <string>
 
 #include "support/host_process.h"
-#include "support/http_client.h"
 #include "ws_runtime/exchange.h"
 
 namespace {
@@ -73,14 +73,6 @@ TEST(PluginLibrary, LifecycleOverThePlatformStandIns) {
   plugin.finalize();
   plugin.finalize();
   EXPECT_EQ(getResources(plugin), "503||");
-}
-
-TEST(PluginLibrary, ServedByTheHostWithoutFlags) {
-  quillon::test_support::HostProcess host({"--quiet"});
-  const auto answer = quillon::test_support::httpRequest(host.port(), "GET", "/quillon/resources");
-  EXPECT_EQ(answer.status, 200);
-  EXPECT_EQ(answer.header("Content-Type"), kMediaType);
-  EXPECT_EQ(host.stop(SIGINT), 0);
 }
 
 }  // namespace
