@@ -2,7 +2,8 @@
 #include <cJSON.h>
 #include <gtest/gtest.h>
 
-#include <functional>
+#include <algorithm>
+#include <future>
 #include <string>
 #include <vector>
 
@@ -14,7 +15,6 @@ namespace {
 namespace test = quillon::test_support;
 
 const std::string kTs = "/quillon/timescales/pendulo/";
-const char* const kNoDevice = "Requested syncableDeviceUri does not exist on this host.";
 
 const std::vector<Tr> kMixed = {
     {"tr0", "IEEE 1588-2008 BC", "00-80-2F-FF-FE-12-34-56", "PTP_MASTER"},
@@ -29,26 +29,55 @@ const std::vector<std::string> kMixedUris = {
     kTs + "tr-1/00-1B-21-FF-FE-AB-CD-EF", kTs + "tr0/00-80-2F-FF-FE-12-34-56",
     kTs + "tr2/00-80-2F-FF-FE-65-43-21", kTs + "tr4/00-80-2F-FF-FE-00-00-04"};
 
+const std::string kDeviceEntry = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
+
 std::string entries(const std::vector<std::string>& uris) {
   std::string out;
   for (const std::string& uri : uris) out += (out.empty() ? "" : ",") + ("{\"uri\":\"" + uri + "\"}");
   return out;
 }
 
-const cJSON* member(const cJSON* object, const char* key) {
-  return cJSON_GetObjectItemCaseSensitive(object, key);
+std::string listing(const std::string& entries) {
+  return "{\"version\":1,\"resources\":[" + entries + "]}";
 }
 
-// An error answer parsed: the envelope, and the record inside its "errorInfo".
-struct ErrorAnswer {
-  explicit ErrorAnswer(const std::string& body) : envelope(cJSON_Parse(body.c_str())) {
-    const cJSON* info = member(member(envelope, "error"), "errorInfo");
-    record = cJSON_IsString(info) ? cJSON_Parse(info->valuestring) : nullptr;
-  }
-  ~ErrorAnswer() { cJSON_Delete(record); cJSON_Delete(envelope); }
-  cJSON* envelope;
-  cJSON* record;
-};
+std::string timescaleDocument(const std::string& uri, const std::string& grandmaster) {
+  return "{\"version\":1,\"uri\":\"" + uri + "\",\"data\":{\"grandmasterId\":\"" + grandmaster + "\"}}";
+}
+
+// The local time keeper's document as the device library writes it.
+std::string deviceDocument(const std::string& requirements, bool coherent) {
+  return "{\"uri\":\"" + std::string(kDeviceUri) + "\",\"coherencyRequirements\":" + requirements +
+         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") + ",\"offsetNanos\":250}";
+}
+
+// The not-found answers, whole: the resource manager's record raised at
+// `line` inside the envelope with the shipped explanation.
+std::string notFound(int line, const std::string& members) {
+  return errorEnvelope(-52006, shippedExplanation(-52006),
+                       "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":"
+                       "\"quillon/ResourceManager\",\"line\":" + std::to_string(line) +
+                           ",\"component\":\"quillon\",\"kosyncdomain_debug\":{" + members + "}}");
+}
+std::string noTimescale(const std::string& wrong, const std::string& list) {
+  return notFound(98, "\"message\":\"Requested timescaleUri does not match any timescaleUri on "
+                      "the system\","
+                      "\"localTimescaleUri\":\"" + wrong + "\",\"currentTimescaleUris\":" + list);
+}
+std::string noDevice(int line, const std::string& wrong) {
+  return notFound(line, "\"message\":\"Requested syncableDeviceUri does not exist on this host.\","
+                        "\"localDeviceUri\":\"" + wrong + "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"");
+}
+
+// The record inside an error answer's "errorInfo", "" without one.
+std::string recordIn(const std::string& body) {
+  cJSON* root = cJSON_Parse(body.c_str());
+  const cJSON* error = cJSON_GetObjectItemCaseSensitive(root, "error");
+  const cJSON* info = cJSON_GetObjectItemCaseSensitive(error, "errorInfo");
+  const std::string record = cJSON_IsString(info) ? info->valuestring : "";
+  cJSON_Delete(root);
+  return record;
+}
 
 void expectAnswer(const test::HttpResponse& r, int status, const std::string& body,
                   const char* statusCodeHeader = nullptr) {
@@ -61,23 +90,17 @@ void expectAnswer(const test::HttpResponse& r, int status, const std::string& bo
 
 TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
   ServiceHost host(scenario(kMixed, "tr 1"));
-  const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
   struct Case {
     std::string target;
     std::string result;
   } cases[] = {
-      {"/quillon/resources",
-       "{\"version\":1,\"resources\":[" + device + "," + entries(kMixedUris) + "]}"},
-      {"/quillon/resources?resourceType=timescales",
-       "{\"version\":1,\"resources\":[" + entries(kMixedUris) + "]}"},
-      {"/quillon/resources?resourceType=syncableDevices",
-       "{\"version\":1,\"resources\":[" + device + "]}"},
-      {"/quillon/resources?resourceType=Timescales", "{\"version\":1,\"resources\":[]}"},
+      {"/quillon/resources", listing(kDeviceEntry + "," + entries(kMixedUris))},
+      {"/quillon/resources?resourceType=timescales", listing(entries(kMixedUris))},
+      {"/quillon/resources?resourceType=syncableDevices", listing(kDeviceEntry)},
+      {"/quillon/resources?resourceType=Timescales", listing("")},
       {kDeviceUri, deviceDocument("null", true)},
-      {kMixedUris[0],
-       "{\"version\":1,\"uri\":\"" + kMixedUris[0] + "\",\"data\":{\"grandmasterId\":\"00:1b:21:ff:fe:ab:cd:ef\"}}"},
-      {kMixedUris[3],
-       "{\"version\":1,\"uri\":\"" + kMixedUris[3] + "\",\"data\":{\"grandmasterId\":\"00:80:2f:ff:fe:00:00:04\"}}"},
+      {kMixedUris[0], timescaleDocument(kMixedUris[0], "00:1b:21:ff:fe:ab:cd:ef")},
+      {kMixedUris[3], timescaleDocument(kMixedUris[3], "00:80:2f:ff:fe:00:00:04")},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.target);
@@ -86,20 +109,14 @@ TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
 
   const std::string list = "[\"" + kMixedUris[0] + "\",\"" + kMixedUris[1] + "\",\"" + kMixedUris[2] +
                            "\",\"" + kMixedUris[3] + "\"]";
-  for (const std::string& wrong : {kTs + "tr-1/00-1b-21-ff-fe-ab-cd-ef", kMixedUris[1].substr(0, kMixedUris[1].size() - 1),
+  for (const std::string& wrong : {kTs + "tr-1/00-1b-21-ff-fe-ab-cd-ef",
+                                   kMixedUris[1].substr(0, kMixedUris[1].size() - 1),
                                    kTs + "tr3/00-80-2F-FF-FE-00-00-03"}) {
     SCOPED_TRACE(wrong);
-    const std::string record = notFoundRecord(
-        98, "Requested timescaleUri does not match any timescaleUri on the system",
-        "\"localTimescaleUri\":\"" + wrong + "\",\"currentTimescaleUris\":" + list);
-    expectAnswer(host.get(wrong), 500, errorEnvelope(-52006, shippedExplanation(-52006), record), "-52006");
+    expectAnswer(host.get(wrong), 500, noTimescale(wrong, list), "-52006");
   }
   const std::string wrongDevice = std::string(kDeviceUri) + "X";
-  expectAnswer(host.get(wrongDevice), 500,
-               errorEnvelope(-52006, shippedExplanation(-52006),
-                             notFoundRecord(75, kNoDevice, "\"localDeviceUri\":\"" + wrongDevice +
-                                                               "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"")),
-               "-52006");
+  expectAnswer(host.get(wrongDevice), 500, noDevice(75, wrongDevice), "-52006");
   EXPECT_EQ(host.process().stop(), 0);
 }
 
@@ -130,16 +147,13 @@ TEST(ServiceOverHttp, RefusalsCarryTheSuccessEnvelopeAndHostReadFailuresTheRawRe
 
 TEST(ServiceOverHttp, NoTimescalesAndEditsWhileRunning) {
   ServiceHost host(scenario({}));
-  const std::string device = std::string("{\"uri\":\"") + kDeviceUri + "\"}";
   // Both steps back of the listing: the device's comma, and the opening bracket.
-  expectAnswer(host.get("/quillon/resources"), 200,
-               successEnvelope("{\"version\":1,\"resources\":[" + device + "]}"));
+  expectAnswer(host.get("/quillon/resources"), 200, successEnvelope(listing(kDeviceEntry)));
   expectAnswer(host.get("/quillon/resources?resourceType=timescales"), 200,
                successEnvelope("{\"version\":1,\"resources\":]}"));
 
   host.writeScenario(scenario({kMixed[2]}));
-  const std::string expected =
-      successEnvelope("{\"version\":1,\"resources\":[" + device + "," + entries({kMixedUris[2]}) + "]}");
+  const std::string expected = successEnvelope(listing(kDeviceEntry + "," + entries({kMixedUris[2]})));
   // The edit must show without restarting the host; the stand-in notices it on
   // its own, so allow it a bounded number of requests.
   std::string last;
@@ -166,18 +180,13 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
     const test::HttpResponse r = host.put(kDeviceUri, bad, vendor);
     EXPECT_EQ(r.status, 500);
     EXPECT_EQ(r.header("X-Status-Code").value_or(""), "-52005");
-    const ErrorAnswer answer(r.body);
-    ASSERT_NE(answer.record, nullptr) << r.body;
-    EXPECT_STREQ(member(answer.record, "error_constant")->valuestring, "koapalerr_invalidParameter");
-    EXPECT_NE(member(answer.record, "kosdlib_debug"), nullptr) << r.body;
-    EXPECT_EQ(member(answer.envelope, "result"), nullptr);
+    const std::string record = recordIn(r.body);
+    EXPECT_EQ(r.body, errorEnvelope(-52005, shippedExplanation(-52005), record));
+    EXPECT_EQ(record.rfind("{\"error_constant\":\"koapalerr_invalidParameter\",", 0), 0u) << record;
+    EXPECT_NE(record.find(",\"kosdlib_debug\":{"), std::string::npos) << record;
   }
   const std::string wrong = "/quillon/syncableDevices/pendulo/timekeeper/generictk";
-  expectAnswer(host.put(wrong, "{}"), 500,
-               errorEnvelope(-52006, shippedExplanation(-52006),
-                             notFoundRecord(127, kNoDevice, "\"localDeviceUri\":\"" + wrong +
-                                                               "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"")),
-               "-52006");
+  expectAnswer(host.put(wrong, "{}"), 500, noDevice(127, wrong), "-52006");
   expectAnswer(host.get(kDeviceUri), 200,
                successEnvelope(deviceDocument("{\"maxOffsetNanos\":100}", false)));
   EXPECT_EQ(host.process().stop(), 0);
@@ -186,51 +195,103 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
 // What a failing time service makes of a listing: the helpers' record, with
 // the service's own nested inside where it was replaced.
 TEST(ServiceOverHttp, TimeServiceErrorsReachTheClientAsTheirEnvelope) {
+  const auto helpers = [](const char* constant, int line, const std::string& debug) {
+    return std::string("{\"error_constant\":\"") + constant +
+           "\",\"file\":\"kosdtools_timescales/timescaleHelpers\",\"line\":" + std::to_string(line) +
+           ",\"component\":\"quillon\",\"kosyncdomain_debug\":{\"message\":\"" + debug + "}";
+  };
   struct Case {
     std::string fault;
     int32_t code;
-    std::string constant;
-    int line;
-    std::string message;
-    int32_t nestedCode;  // 0: none
+    std::string head;  // the record up to the time service's own
+    std::string tail;
   } cases[] = {
-      {"{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"code\":-1074100990}",
-       -52006, "koapalerr_resourceNotFound", 182,
-       "Pendulo does not have the specified attr; maybe the target is running an older version of Pendulo.",
-       -1074100990},
-      {"{\"call\":\"getTrAttrJson\",\"trId\":\"tr2\",\"key\":\"type\",\"code\":-1074100991}",
-       -52006, "koapalerr_resourceNotFound", 221, "The specified Pendulo Time Reference does not exist.",
-       -1074100991},
-      {"{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"answer\":\"not json\"}",
-       -52005, "koapalerr_invalidParameter", 193, "Failed to parse TR IDs from TR list JSON.", 0},
+      {"{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"code\":-1074100990}", -52006,
+       helpers("koapalerr_resourceNotFound", 182,
+               "Pendulo does not have the specified attr; maybe the target is running an older version of "
+               "Pendulo.\",\"attrKey\":\"timeReferences\"") + ",\"nested_error\":[{",
+       ",\"code\":-1074100990}]}"},
+      {"{\"call\":\"getTrAttrJson\",\"trId\":\"tr2\",\"key\":\"type\",\"code\":-1074100991}", -52006,
+       helpers("koapalerr_resourceNotFound", 221,
+               "The specified Pendulo Time Reference does not exist.\",\"timeReferenceId\":\"tr2\","
+               "\"timeReferenceTypeKey\":\"type\"") + ",\"nested_error\":[{",
+       ",\"code\":-1074100991}]}"},
+      {"{\"call\":\"getPdmAttrJson\",\"key\":\"timeReferences\",\"answer\":\"not json\"}", -52005,
+       helpers("koapalerr_invalidParameter", 193,
+               "Failed to parse TR IDs from TR list JSON.\",\"trListJson\":\"not json\","
+               "\"trIds\":\"timeReferences\"") + "}",
+       ""},
   };
   for (const Case& c : cases) {
-    SCOPED_TRACE(c.message);
+    SCOPED_TRACE(c.fault);
     ServiceHost host(scenario({kMixed[0], kMixed[2]}, "", "\"faults\":[" + c.fault + "]"));
     for (const std::string& target : {std::string("/quillon/resources"), kMixedUris[1]}) {
       SCOPED_TRACE(target);
       const test::HttpResponse r = host.get(target);
-      EXPECT_EQ(r.status, 500);
-      EXPECT_EQ(r.header("X-Status-Code").value_or(""), std::to_string(c.code));
-      const ErrorAnswer answer(r.body);
-      const cJSON* error = member(answer.envelope, "error");
-      ASSERT_NE(answer.record, nullptr) << r.body;
-      EXPECT_TRUE(cJSON_IsFalse(member(error, "success")));
-      EXPECT_EQ(member(error, "errorCode")->valueint, c.code);
-      const cJSON* record = answer.record;
-      EXPECT_STREQ(member(record, "error_constant")->valuestring, c.constant.c_str());
-      EXPECT_STREQ(member(record, "file")->valuestring, "kosdtools_timescales/timescaleHelpers");
-      EXPECT_EQ(member(record, "line")->valueint, c.line);
-      EXPECT_STREQ(member(member(record, "kosyncdomain_debug"), "message")->valuestring, c.message.c_str());
-      const cJSON* nested = member(record, "nested_error");
-      EXPECT_EQ(nested == nullptr, c.nestedCode == 0);
-      ASSERT_EQ(cJSON_GetArraySize(nested), c.nestedCode == 0 ? 0 : 1);
-      if (c.nestedCode != 0) {
-        EXPECT_EQ(member(cJSON_GetArrayItem(nested, 0), "code")->valueint, c.nestedCode);
-      }
+      const std::string record = recordIn(r.body);
+      expectAnswer(r, 500, errorEnvelope(c.code, shippedExplanation(c.code), record),
+                   std::to_string(c.code).c_str());
+      ASSERT_GE(record.size(), c.head.size() + c.tail.size()) << record;
+      EXPECT_EQ(record.substr(0, c.head.size()), c.head);
+      EXPECT_EQ(record.substr(record.size() - c.tail.size()), c.tail);
     }
     EXPECT_EQ(host.process().stop(), 0);
   }
+}
+
+// Many clients at once against one host: every answer must be one that a
+// single client could have received.
+TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
+  constexpr int kThreads = 8;
+  constexpr int kRequestsPerThread = 2000;
+  ServiceHost host(scenario({kMixed[0], kMixed[2]}));
+  const std::string& boundary = kMixedUris[1];
+  const std::string& master = kMixedUris[2];
+  const std::string timescales = entries({boundary, master});
+  const std::string wrongTs = kTs + "tr2/00-80-2f-ff-fe-65-43-21";
+  const std::string wrongDevice = std::string(kDeviceUri) + "X";
+  struct Expected {
+    std::string method;
+    std::string target;
+    std::string body;
+    int status;
+    std::vector<std::string> answers;  // any one of them
+  };
+  const std::vector<Expected> mix = {
+      {"GET", "/quillon/resources", "", 200, {successEnvelope(listing(kDeviceEntry + "," + timescales))}},
+      {"GET", "/quillon/resources?resourceType=timescales", "", 200, {successEnvelope(listing(timescales))}},
+      {"GET", master, "", 200, {successEnvelope(timescaleDocument(master, "00:80:2f:ff:fe:65:43:21"))}},
+      {"GET", wrongTs, "", 500, {noTimescale(wrongTs, "[\"" + boundary + "\",\"" + master + "\"]")}},
+      {"PUT", kDeviceUri, "{\"maxOffsetNanos\":1000}", 200, {successEnvelope("{}")}},
+      {"GET", kDeviceUri, "", 200,
+       {successEnvelope(deviceDocument("null", true)),
+        successEnvelope(deviceDocument("{\"maxOffsetNanos\":1000}", true)),
+        successEnvelope(deviceDocument("{\"maxOffsetNanos\":100}", false))}},
+      {"PUT", wrongDevice, "{}", 500, {noDevice(127, wrongDevice)}},
+      {"PUT", kDeviceUri, "{\"maxOffsetNanos\":100}", 200, {successEnvelope("{}")}},
+      {"GET", "/quillon/unknownCommand", "", 404, {successEnvelope()}},
+  };
+
+  // Each client answers with its first wrong answer, or "" when all were right.
+  std::vector<std::future<std::string>> clients;
+  for (int t = 0; t < kThreads; ++t) {
+    clients.push_back(std::async(std::launch::async, [&, t] {
+      test::HttpClient client(host.port());
+      for (int i = 0; i < kRequestsPerThread; ++i) {
+        const Expected& e = mix[(i + t) % mix.size()];
+        const test::HttpResponse r = client.send(test::HttpRequest{e.method, e.target, {}, e.body});
+        if (r.status != e.status ||
+            std::find(e.answers.begin(), e.answers.end(), r.body) == e.answers.end()) {
+          return e.method + " " + e.target + " -> " + std::to_string(r.status) + " " + r.body;
+        }
+      }
+      return std::string();
+    }));
+  }
+  for (auto& client : clients) EXPECT_EQ(client.get(), "");
+  EXPECT_EQ(host.process().stop(), 0) << host.process().log();
+  // A sanitizer build of the host reports races and leaks in its log.
+  EXPECT_EQ(host.process().log().find("Sanitizer"), std::string::npos) << host.process().log();
 }
 
 }  // namespace

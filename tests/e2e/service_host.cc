@@ -50,18 +50,6 @@ test::HttpResponse ServiceHost::put(const std::string& target, const std::string
   return test::httpRequest(port(), "PUT", target, headers, body);
 }
 
-std::string deviceDocument(const std::string& requirements, bool coherent) {
-  return std::string("{\"uri\":\"") + kDeviceUri + "\",\"coherencyRequirements\":" + requirements +
-         ",\"plugin\":\"pendulo\",\"coherent\":" + (coherent ? "true" : "false") +
-         ",\"offsetNanos\":250}";
-}
-
-std::string notFoundRecord(int line, const std::string& message, const std::string& members) {
-  return "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"quillon/ResourceManager\","
-         "\"line\":" + std::to_string(line) + ",\"component\":\"quillon\",\"kosyncdomain_debug\":{"
-         "\"message\":\"" + message + "\"," + members + "}}";
-}
-
 std::string shippedExplanation(int32_t code) {
   std::ifstream file(std::string(QUILLON_SHARE_DIR) + "/errors/English/quillon.txt", std::ios::binary);
   const std::string text((std::istreambuf_iterator<char>(file)), std::istreambuf_iterator<char>());

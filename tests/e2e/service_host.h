@@ -60,11 +60,6 @@ class ServiceHost {
   std::unique_ptr<quillon::test_support::HostProcess> host_;
 };
 
-// The device library's document of the local time keeper.
-std::string deviceDocument(const std::string& requirements, bool coherent);
-// The resource manager's not-found record raised at `line`, with `members`
-// (already JSON) after its message.
-std::string notFoundRecord(int line, const std::string& message, const std::string& members);
 // The explanation of `code` in the shipped English explanations file: the
 // lines between the entry's tags, line ends included.
 std::string shippedExplanation(int32_t code);
