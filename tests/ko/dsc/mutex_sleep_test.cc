@@ -46,25 +46,26 @@ TEST(RecursiveMutex, NestsForItsOwnerAndIgnoresUnlockFromOtherThreads) {
   const FlagFile flag(nullptr);
   const RealtimeKernel kernel(flag.path);
   RecursiveMutex mutex(kernel);
-  EXPECT_EQ(mutex.owner(), pthread_t{0});
+  // "<count> <owner>", the owner being this thread, nobody or another one.
+  const auto state = [&] {
+    const pthread_t owner = mutex.owner();
+    return std::to_string(mutex.count()) + (pthread_equal(owner, pthread_self()) ? " mine"
+                                            : owner == pthread_t{0}              ? " free"
+                                                                                 : " other");
+  };
+  EXPECT_EQ(state(), "0 free");
   mutex.lock();
   mutex.lock();
-  EXPECT_TRUE(pthread_equal(mutex.owner(), pthread_self()));
-  EXPECT_EQ(mutex.count(), 2);
-
+  EXPECT_EQ(state(), "2 mine");
   std::thread([&] { mutex.unlock(); }).join();
-  EXPECT_EQ(mutex.count(), 2);
-  EXPECT_TRUE(pthread_equal(mutex.owner(), pthread_self()));
-
+  EXPECT_EQ(state(), "2 mine");
   mutex.unlock();
-  EXPECT_EQ(mutex.count(), 1);
-  EXPECT_TRUE(pthread_equal(mutex.owner(), pthread_self()));
+  EXPECT_EQ(state(), "1 mine");
   mutex.unlock();
-  EXPECT_EQ(mutex.count(), 0);
-  EXPECT_EQ(mutex.owner(), pthread_t{0});
+  EXPECT_EQ(state(), "0 free");
   // A second release by the former owner finds no owner and does nothing.
   mutex.unlock();
-  EXPECT_EQ(mutex.count(), 0);
+  EXPECT_EQ(state(), "0 free");
 }
 
 TEST(RecursiveMutex, ExcludesOtherThreads) {
