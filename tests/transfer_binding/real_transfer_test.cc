@@ -3,13 +3,12 @@
 // the test.
 #include <gtest/gtest.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
 #include <cstdio>
-#include <fstream>
 #include <string>
 
 #include "support/host_process.h"
+#include "support/scratch.h"
 
 namespace {
 
@@ -23,9 +22,9 @@ struct ClientRun {
 
 // Runs the example client through the shell; standard error goes to a file.
 ClientRun runClient(const std::string& args) {
-  char errPath[] = "/tmp/transfer_client_err_XXXXXX";
-  ::close(::mkstemp(errPath));
-  const std::string command = std::string(TRANSFER_CLIENT_PATH) + " " + args + " 2>" + errPath;
+  const answers_test::ScratchDir scratch;
+  const std::string command =
+      std::string(TRANSFER_CLIENT_PATH) + " " + args + " 2>" + scratch.file("err");
   ClientRun run;
   FILE* pipe = ::popen(command.c_str(), "r");
   char buffer[512];
@@ -34,9 +33,7 @@ ClientRun runClient(const std::string& args) {
   }
   const int status = ::pclose(pipe);
   run.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  std::ifstream err(errPath);
-  std::getline(err, run.err, '\0');
-  ::unlink(errPath);
+  run.err = scratch.read("err");
   return run;
 }
 
