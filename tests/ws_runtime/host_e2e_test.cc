@@ -148,8 +148,9 @@ TEST(HostEndToEnd, StartUpFailuresNameTheirCause) {
 TEST(HostEndToEnd, StopLetsTheRequestInProgressFinishThenFinalizesOnce) {
   Scratch scratch;
   ASSERT_EQ(::mkfifo(scratch.file("gate").c_str(), 0600), 0);
-  HostProcess host(echoArgs(), {{"ECHO_PLUGIN_LOG", scratch.file("log")},
-                                {"ECHO_PLUGIN_GATE", scratch.file("gate")}});
+  // Two threads: the second stays free to answer while the first is held.
+  HostProcess host(echoArgs({"--threads", "2"}), {{"ECHO_PLUGIN_LOG", scratch.file("log")},
+                                                  {"ECHO_PLUGIN_GATE", scratch.file("gate")}});
   auto blocked = std::async(std::launch::async, [&] {
     return quillon::test_support::httpRequest(host.port(), "GET", "/echo/gate");
   });
@@ -158,6 +159,10 @@ TEST(HostEndToEnd, StopLetsTheRequestInProgressFinishThenFinalizesOnce) {
   ASSERT_GE(gate, 0);
   host.signal(SIGTERM);
   ASSERT_TRUE(host.waitForLog("stopping on SIGTERM"));
+  // A client arriving while the host drains is told so at once.
+  const HttpResponse late = quillon::test_support::httpRequest(host.port(), "GET", "/echo/late");
+  EXPECT_EQ(late.status, 503);
+  EXPECT_EQ(late.header("Connection").value_or(""), "close");
   ::close(gate);
   const HttpResponse answer = blocked.get();
   EXPECT_EQ(answer.status, 200);

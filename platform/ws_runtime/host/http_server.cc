@@ -185,9 +185,11 @@ uint16_t HttpServer::port() const {
 }
 
 void HttpServer::beginStop() {
-  if (daemon_ == nullptr || stopping_.exchange(true)) return;
-  const MHD_socket listener = MHD_quiesce_daemon(daemon_);
-  if (listener != MHD_INVALID_SOCKET) ::close(listener);
+  // The listening socket stays with the daemon until it stops: taking it
+  // away (quiescing) while the pool threads still watch it races with their
+  // own removal of it, which the library treats as fatal. A client that
+  // connects meanwhile gets a prompt 503 instead.
+  if (daemon_ != nullptr) stopping_.store(true);
 }
 
 void HttpServer::finishStop(std::chrono::milliseconds grace) {

@@ -36,8 +36,8 @@ class HttpServer {
   [[nodiscard]] bool start(std::string& error);
   // The bound port (useful with port 0).
   uint16_t port() const;
-  // Stops accepting; from now on a new request on an open connection is
-  // answered 503 and the connection closed.
+  // From now on every new request, on a new connection or a kept-alive one,
+  // is answered 503 and its connection closed.
   void beginStop();
   // Lets the requests in progress finish for at most `grace`, then closes
   // every connection and joins the threads. No Run is active afterwards.
