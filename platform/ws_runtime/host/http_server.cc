@@ -230,10 +230,8 @@ void HttpServer::onConnection(void*, MHD_Connection*, void** socketContext,
     *socketContext = nullptr;
     return;
   }
-  // Only the allocation happens here, on the accepting path; the address is
-  // written out at the connection's first request. A slow accept loop lets a
-  // second pool thread wake and take part of a burst of new connections,
-  // which splits the load where one thread alone would keep up.
+  // Only the allocation happens here, inside the daemon's accept loop; the
+  // address is written out when the connection's first request needs it.
   *socketContext = new (std::nothrow) Connection();
 }
 
