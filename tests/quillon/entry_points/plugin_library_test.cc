@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <thread>
 
 #include "support/host_process.h"
 #include "ws_runtime/exchange.h"
@@ -54,25 +55,33 @@ std::string getResources(const LoadedPlugin& plugin) {
          exchange.response().body;
 }
 
+// The plug-in runs on a thread of its own that ends before the process does,
+// as under a host whose pool threads answer the requests. It matters for the
+// leak check at exit: GCC 12's LeakSanitizer takes a dynamic TLS block of a
+// dlopen'ed library that happens to start 16 bytes into a page for an old
+// glibc layout, reads a bogus range from the allocator's header and crashes
+// scanning it; it only scans threads that are still alive.
 TEST(PluginLibrary, LifecycleOverThePlatformStandIns) {
   LoadedPlugin plugin;
-  EXPECT_EQ(getResources(plugin), "503||") << "before Init";
-  plugin.init();
-  const std::string answer = getResources(plugin);
-  EXPECT_EQ(answer.rfind(std::string("200|") + kMediaType + "|{\"error\":{\"success\":true,", 0),
-            0u)
-      << answer;
-  EXPECT_NE(answer.find("/quillon/syncableDevices/pendulo/timekeeper/genericTk"),
-            std::string::npos);
-  plugin.pause();
-  EXPECT_EQ(getResources(plugin), answer);
-  plugin.resume();
-  plugin.init();  // replaces the graph
-  EXPECT_EQ(getResources(plugin), answer);
-  plugin.run(nullptr, 0);
-  plugin.finalize();
-  plugin.finalize();
-  EXPECT_EQ(getResources(plugin), "503||");
+  std::thread([&plugin] {
+    EXPECT_EQ(getResources(plugin), "503||") << "before Init";
+    plugin.init();
+    const std::string answer = getResources(plugin);
+    EXPECT_EQ(answer.rfind(std::string("200|") + kMediaType + "|{\"error\":{\"success\":true,", 0),
+              0u)
+        << answer;
+    EXPECT_NE(answer.find("/quillon/syncableDevices/pendulo/timekeeper/genericTk"),
+              std::string::npos);
+    plugin.pause();
+    EXPECT_EQ(getResources(plugin), answer);
+    plugin.resume();
+    plugin.init();  // replaces the graph
+    EXPECT_EQ(getResources(plugin), answer);
+    plugin.run(nullptr, 0);
+    plugin.finalize();
+    plugin.finalize();
+    EXPECT_EQ(getResources(plugin), "503||");
+  }).join();
 }
 
 }  // namespace
