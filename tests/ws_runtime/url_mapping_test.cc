@@ -37,6 +37,9 @@ TEST(UrlMapping, RoutesAndDecodesSegmentsAndQuery) {
       {"/quillon/s/p/t/n", {{"plugin", "q"}, {"resource%54ype", "a+b"}}, U"s", U"p", U"t", U"n",
        U"a+b"},
       {"/quil%6Con/resources", {}, U"resources", U"<none>", U"<none>", U"<none>", U"<none>"},
+      // UTF-8 sent as raw bytes rather than escapes.
+      {"/quillon/x/caf\xC3\xA9/t/n", {{"resourceType", "\xE2\x82\xAC"}}, U"x", U"caf\u00e9", U"t",
+       U"n", U"\u20ac"},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.path);
@@ -72,6 +75,8 @@ TEST(UrlMapping, RejectsOtherPathsAndBadEncodingsWithoutTouchingTheRequest) {
       {"/quillon/%ED%A0%80", {}, Mapping::kBadRequest},     // surrogate
       {"/quillon/%F4%90%80%80", {}, Mapping::kBadRequest},  // above U+10FFFF
       {"/quillon/%FF", {}, Mapping::kBadRequest},
+      {"/quillon/\xC3", {}, Mapping::kBadRequest},
+      {"/quillon/r", {{"k\xFF", "v"}}, Mapping::kBadRequest},
       {"/quillon/r", {{"k", "%E2%82"}}, Mapping::kBadRequest},
   };
   for (const Case& c : cases) {

@@ -35,8 +35,35 @@ size_t splitPath(std::string_view path, Segments& segments) {
   return count;
 }
 
+// Nearly every component a client sends is plain ASCII without escapes; it
+// decodes to itself, so it needs neither decoder.
+bool isPlainAscii(std::string_view text) {
+  for (const char c : text) {
+    if (c == '%' || static_cast<unsigned char>(c) >= 0x80) return false;
+  }
+  return true;
+}
+
+void widen(std::string_view text, std::u32string& out) {
+  out.resize(text.size());
+  for (size_t i = 0; i < text.size(); ++i) out[i] = static_cast<unsigned char>(text[i]);
+}
+
 bool decodeComponent(std::string_view raw, std::string& scratch, std::u32string& out) {
+  if (isPlainAscii(raw)) {
+    widen(raw, out);
+    return true;
+  }
   return percentDecode(raw, scratch) && utf8Decode(scratch, out);
+}
+
+bool decodes(std::string_view raw, std::string& scratch, std::u32string& checked) {
+  return isPlainAscii(raw) || decodeComponent(raw, scratch, checked);
+}
+
+bool namesService(std::string_view raw, std::string_view service, std::string& scratch) {
+  if (raw.find('%') == std::string_view::npos) return raw == service;
+  return percentDecode(raw, scratch) && scratch == service;
 }
 
 }  // namespace
@@ -105,15 +132,14 @@ Mapping mapUrl(std::string_view service, std::string_view rawPath,
   // allocates nothing once warm.
   thread_local std::string scratch;
   thread_local std::u32string checked;
-  if (!percentDecode(raw[0], scratch) || scratch != service) return Mapping::kNotFound;
+  if (!namesService(raw[0], service, scratch)) return Mapping::kNotFound;
   if (count != kCommandOnly && count != kWithResource) return Mapping::kNotFound;
   for (size_t i = 1; i < count; ++i) {
     if (raw[i].empty()) return Mapping::kNotFound;
-    if (!decodeComponent(raw[i], scratch, checked)) return Mapping::kBadRequest;
+    if (!decodes(raw[i], scratch, checked)) return Mapping::kBadRequest;
   }
   for (const RawParameter& parameter : query) {
-    if (!decodeComponent(parameter.key, scratch, checked) ||
-        !decodeComponent(parameter.value, scratch, checked)) {
+    if (!decodes(parameter.key, scratch, checked) || !decodes(parameter.value, scratch, checked)) {
       return Mapping::kBadRequest;
     }
   }

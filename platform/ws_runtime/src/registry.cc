@@ -8,14 +8,14 @@ void ExchangeRequest::addVariable(std::u32string name, std::u32string value) {
   variables.emplace_back(std::move(name), std::move(value));
 }
 
-void ExchangeRequest::setContentType(std::string value) {
+void ExchangeRequest::setContentType(std::string_view value) {
   hasContentType = true;
-  contentType = std::move(value);
+  contentType.assign(value);
 }
 
-void ExchangeRequest::setAccept(std::string value) {
+void ExchangeRequest::setAccept(std::string_view value) {
   hasAccept = true;
-  accept = std::move(value);
+  accept.assign(value);
 }
 
 namespace detail {

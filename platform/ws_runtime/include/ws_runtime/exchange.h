@@ -20,6 +20,7 @@
 
 #include <cstdint>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -43,8 +44,10 @@ struct WS_RUNTIME_API ExchangeRequest {
 
   // Defines a variable; an earlier one of the same name keeps precedence.
   void addVariable(std::u32string name, std::u32string value);
-  void setContentType(std::string value);
-  void setAccept(std::string value);
+  // Both copy into the existing storage, so a reused request does not
+  // allocate for headers of the size it has seen before.
+  void setContentType(std::string_view value);
+  void setAccept(std::string_view value);
 };
 
 // What the plug-in answered.
