@@ -1,7 +1,9 @@
 // The floor under the host: libmicrohttpd alone, configured as ws-runtime
 // configures it (epoll, a pool of threads accepting for themselves, the
-// answer queued on the handler's last call), serving one fixed answer with
-// no plug-in, no URL mapping and no per-request state. bench/host/run.sh
+// answer queued on the handler's last call, the same connection memory) but
+// without the host's idle timeout, which libmicrohttpd pays for on every
+// request; it serves one fixed answer with no plug-in, no URL mapping and no
+// per-request state. bench/host/run.sh
 // measures the host against it, so that what the host adds is seen apart
 // from what the machine and the library allow.
 //

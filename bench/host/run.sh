@@ -7,10 +7,12 @@
 #   nginx-*    nginx (2 workers, keep-alive) serving each answer's bytes and Content-Type
 #   bare       libmicrohttpd alone (bare-http-daemon, 2 pool threads) serving the
 #              immediate answer: the floor under the host on this machine
-# Prints requests per second and p99 latency per run, then the mean ratios.
-# On 2 cores wrk takes one; the daemon's pool threads accept for themselves,
-# so a run's connections land on one thread or are split, and single runs
-# differ by up to a third: compare means over several rounds.
+# Prints requests per second, p99 latency and the busiest thread's share of
+# the server's CPU per run, then the mean ratios. On 2 cores wrk takes one;
+# the daemon's pool threads (and nginx's workers) accept for themselves, so a
+# run's connections land on one thread (busiest near 1.00) or are split
+# (near 0.50), and single runs differ by up to a third: compare means over
+# several rounds, and runs of the same kind with each other.
 #
 # Usage: bench/host/run.sh [ROUNDS]      (installs wrk and nginx when missing)
 set -euo pipefail
@@ -46,18 +48,20 @@ wait_for() {  # url
   exit 1
 }
 
-start_host() {  # port plugin service
+declare -A server  # target -> the pid whose threads, or worker processes, serve it
+start_host() {  # port plugin service target
   "$build/bin/ws-runtime" --listen "127.0.0.1:$1" --plugin "$2" --service "$3" --threads 2 --quiet \
     2>>"$work/host.log" &
   pids+=($!)
+  server[$4]=$!
   wait_for "http://127.0.0.1:$1/$3/resources"
 }
 
 host_port=$(free_port)
 quillon_port=$(free_port)
 nginx_port=$(free_port)
-start_host "$host_port" "$build/lib/libws_runtime_echo_plugin.so" echo
-start_host "$quillon_port" "$build/lib/libquillon.so.1" quillon
+start_host "$host_port" "$build/lib/libws_runtime_echo_plugin.so" echo immediate
+start_host "$quillon_port" "$build/lib/libquillon.so.1" quillon quillon
 
 # nginx gets each answer's exact bytes and Content-Type.
 mkdir -p "$work/www" "$work/nginx"
@@ -72,6 +76,7 @@ bare_port=$(free_port)
 "$build/bin/bare-http-daemon" "$bare_port" 2 "$work/www/immediate" "${types[immediate]}" \
   2>>"$work/host.log" &
 pids+=($!)
+server[bare]=$!
 wait_for "http://127.0.0.1:$bare_port/"
 curl -fs "http://127.0.0.1:$bare_port/" | cmp -s - "$work/www/immediate" ||
   { echo "bench: the bare daemon does not serve the immediate answer" >&2; exit 1; }
@@ -96,24 +101,44 @@ http {
 CONF
 nginx -p "$work/nginx" -c "$work/nginx/nginx.conf" &
 pids+=($!)
+server[nginx-immediate]=$!
+server[nginx-quillon]=$!
 wait_for "http://127.0.0.1:$nginx_port/immediate"
 for target in immediate quillon; do
   curl -fs "http://127.0.0.1:$nginx_port/$target" | cmp -s - "$work/www/$target" ||
     { echo "bench: nginx does not serve the same bytes for $target" >&2; exit 1; }
 done
 
-# One wrk run: prints "<requests/s> <p99 in ms>".
-measure() {  # url connections
-  wrk -t1 -c"$2" -d"$duration" --latency "$1" | awk '
+# CPU ticks used so far by each thread of the process and, for nginx, by each
+# worker process: "<id> <ticks>" per line.
+cpu_ticks() {  # pid
+  local unit
+  for unit in /proc/"$1"/task/* $(pgrep -P "$1" | sed 's|^|/proc/|'); do
+    awk -v id="${unit##*/}" '{ print id, $14 + $15 }' "$unit/stat" 2>/dev/null
+  done | sort
+}
+
+# One wrk run: prints "<requests/s> <p99 in ms> <busiest thread's CPU share>".
+measure() {  # url connections pid
+  local before after
+  before=$(cpu_ticks "$3")
+  local result
+  result=$(wrk -t1 -c"$2" -d"$duration" --latency "$1" | awk '
     /Requests\/sec/ { rps = $2 }
     /^ +99%/ { v = $2; if (v ~ /us$/) { sub(/us/, "", v); v /= 1000 }
                else if (v ~ /ms$/) { sub(/ms/, "", v) } else if (v ~ /s$/) { sub(/s/, "", v); v *= 1000 }
                p99 = v }
-    END { printf "%.0f %.3f\n", rps, p99 }'
+    END { printf "%.0f %.3f\n", rps, p99 }')
+  after=$(cpu_ticks "$3")
+  local busiest
+  busiest=$(join <(echo "$before") <(echo "$after") |
+    awk '{ d = $3 - $2; total += d; if (d > max) max = d }
+         END { printf "%.2f", (total > 0 ? max / total : 0) }')
+  echo "$result $busiest"
 }
 
 declare -A sum
-printf '%-6s %-14s %5s %12s %10s\n' round target conns 'req/s' 'p99 ms'
+printf '%-6s %-14s %5s %12s %10s %8s\n' round target conns 'req/s' 'p99 ms' busiest
 for round in $(seq 1 "$rounds"); do
   for conns in 16 64; do
     for target in immediate nginx-immediate bare quillon nginx-quillon; do
@@ -123,8 +148,8 @@ for round in $(seq 1 "$rounds"); do
         bare) url="http://127.0.0.1:$bare_port/" ;;
         nginx-*) url="http://127.0.0.1:$nginx_port/${target#nginx-}" ;;
       esac
-      read -r rps p99 < <(measure "$url" "$conns")
-      printf '%-6s %-14s %5s %12s %10s\n' "$round" "$target" "$conns" "$rps" "$p99"
+      read -r rps p99 busiest < <(measure "$url" "$conns" "${server[$target]}")
+      printf '%-6s %-14s %5s %12s %10s %8s\n' "$round" "$target" "$conns" "$rps" "$p99" "$busiest"
       sum[$target-$conns]=$(( ${sum[$target-$conns]:-0} + rps ))
     done
   done
