@@ -120,9 +120,8 @@ cpu_ticks() {  # pid
 
 # One wrk run: prints "<requests/s> <p99 in ms> <busiest thread's CPU share>".
 measure() {  # url connections pid
-  local before after
+  local before after result busiest
   before=$(cpu_ticks "$3")
-  local result
   result=$(wrk -t1 -c"$2" -d"$duration" --latency "$1" | awk '
     /Requests\/sec/ { rps = $2 }
     /^ +99%/ { v = $2; if (v ~ /us$/) { sub(/us/, "", v); v /= 1000 }
@@ -130,7 +129,6 @@ measure() {  # url connections pid
                p99 = v }
     END { printf "%.0f %.3f\n", rps, p99 }')
   after=$(cpu_ticks "$3")
-  local busiest
   busiest=$(join <(echo "$before") <(echo "$after") |
     awk '{ d = $3 - $2; total += d; if (d > max) max = d }
          END { printf "%.2f", (total > 0 ? max / total : 0) }')

@@ -35,30 +35,21 @@ size_t splitPath(std::string_view path, Segments& segments) {
   return count;
 }
 
-// Nearly every component a client sends is plain ASCII without escapes; it
-// decodes to itself, so it needs neither decoder.
-bool isPlainAscii(std::string_view text) {
-  for (const char c : text) {
-    if (c == '%' || static_cast<unsigned char>(c) >= 0x80) return false;
+// Nearly every component a client sends is plain ASCII without escapes and
+// decodes to itself: it is widened in one pass, and only a component with a
+// '%' or a byte above 0x7F goes through the two decoders.
+bool widenPlain(std::string_view text, std::u32string& out) {
+  out.resize(text.size());
+  for (size_t i = 0; i < text.size(); ++i) {
+    const auto c = static_cast<unsigned char>(text[i]);
+    if (c == '%' || c >= 0x80) return false;
+    out[i] = c;
   }
   return true;
 }
 
-void widen(std::string_view text, std::u32string& out) {
-  out.resize(text.size());
-  for (size_t i = 0; i < text.size(); ++i) out[i] = static_cast<unsigned char>(text[i]);
-}
-
 bool decodeComponent(std::string_view raw, std::string& scratch, std::u32string& out) {
-  if (isPlainAscii(raw)) {
-    widen(raw, out);
-    return true;
-  }
-  return percentDecode(raw, scratch) && utf8Decode(scratch, out);
-}
-
-bool decodes(std::string_view raw, std::string& scratch, std::u32string& checked) {
-  return isPlainAscii(raw) || decodeComponent(raw, scratch, checked);
+  return widenPlain(raw, out) || (percentDecode(raw, scratch) && utf8Decode(scratch, out));
 }
 
 bool namesService(std::string_view raw, std::string_view service, std::string& scratch) {
@@ -136,10 +127,11 @@ Mapping mapUrl(std::string_view service, std::string_view rawPath,
   if (count != kCommandOnly && count != kWithResource) return Mapping::kNotFound;
   for (size_t i = 1; i < count; ++i) {
     if (raw[i].empty()) return Mapping::kNotFound;
-    if (!decodes(raw[i], scratch, checked)) return Mapping::kBadRequest;
+    if (!decodeComponent(raw[i], scratch, checked)) return Mapping::kBadRequest;
   }
   for (const RawParameter& parameter : query) {
-    if (!decodes(parameter.key, scratch, checked) || !decodes(parameter.value, scratch, checked)) {
+    if (!decodeComponent(parameter.key, scratch, checked) ||
+        !decodeComponent(parameter.value, scratch, checked)) {
       return Mapping::kBadRequest;
     }
   }
