@@ -24,27 +24,30 @@ TEST(UrlMapping, RoutesAndDecodesSegmentsAndQuery) {
   struct Case {
     const char* path;
     std::vector<RawParameter> query;
-    std::u32string command, plugin, type, name, resourceType;
+    std::u32string decodedPath, command, plugin, type, name, resourceType;
   } cases[] = {
-      {"/quillon/resources", {}, U"resources", U"<none>", U"<none>", U"<none>", U"<none>"},
-      {"/quillon/resources", {{"resourceType", "timescales"}}, U"resources", U"<none>", U"<none>",
-       U"<none>", U"timescales"},
-      {"/quillon/timescales/pendulo/tr%2F0/a%20b", {}, U"timescales", U"pendulo", U"tr/0", U"a b",
-       U"<none>"},
-      {"/quillon/x/%C3%A9/%E2%82%AC/%F0%9F%98%80", {}, U"x", U"\u00e9", U"\u20ac", U"\U0001F600",
-       U"<none>"},
+      {"/quillon/resources", {}, U"/quillon/resources", U"resources", U"<none>", U"<none>",
+       U"<none>", U"<none>"},
+      {"/quillon/resources", {{"resourceType", "timescales"}}, U"/quillon/resources",
+       U"resources", U"<none>", U"<none>", U"<none>", U"timescales"},
+      {"/quillon/timescales/pendulo/tr%2F0/a%20b", {}, U"/quillon/timescales/pendulo/tr/0/a b",
+       U"timescales", U"pendulo", U"tr/0", U"a b", U"<none>"},
+      {"/quillon/x/%C3%A9/%E2%82%AC/%F0%9F%98%80", {}, U"/quillon/x/\u00e9/\u20ac/\U0001F600",
+       U"x", U"\u00e9", U"\u20ac", U"\U0001F600", U"<none>"},
       // Route variables come first; a query cannot replace them.
-      {"/quillon/s/p/t/n", {{"plugin", "q"}, {"resource%54ype", "a+b"}}, U"s", U"p", U"t", U"n",
-       U"a+b"},
-      {"/quil%6Con/resources", {}, U"resources", U"<none>", U"<none>", U"<none>", U"<none>"},
+      {"/quillon/s/p/t/n", {{"plugin", "q"}, {"resource%54ype", "a+b"}}, U"/quillon/s/p/t/n",
+       U"s", U"p", U"t", U"n", U"a+b"},
+      {"/quil%6Con/resources", {}, U"/quillon/resources", U"resources", U"<none>", U"<none>",
+       U"<none>", U"<none>"},
       // UTF-8 sent as raw bytes rather than escapes.
-      {"/quillon/x/caf\xC3\xA9/t/n", {{"resourceType", "\xE2\x82\xAC"}}, U"x", U"caf\u00e9", U"t",
-       U"n", U"\u20ac"},
+      {"/quillon/x/caf\xC3\xA9/t/n", {{"resourceType", "\xE2\x82\xAC"}},
+       U"/quillon/x/caf\u00e9/t/n", U"x", U"caf\u00e9", U"t", U"n", U"\u20ac"},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.path);
     ws::runtime::ExchangeRequest request;
     ASSERT_EQ(ws::host::mapUrl("quillon", c.path, c.query, request), Mapping::kMapped);
+    EXPECT_EQ(request.path, c.decodedPath);
     EXPECT_EQ(request.command, c.command);
     EXPECT_EQ(variable(request, U"plugin"), c.plugin);
     EXPECT_EQ(variable(request, U"type"), c.type);

@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <netinet/in.h>
 #include <sys/socket.h>
+#include <strings.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -15,6 +16,19 @@
 #include "ws_runtime/exchange.h"
 
 namespace ws::host {
+
+// What the plug-in may read of a request's head besides its path.
+struct HttpServer::RequestHead {
+  std::vector<RawParameter> query;
+  const char* contentType = nullptr;
+  const char* accept = nullptr;
+
+  void clear() {
+    query.clear();
+    contentType = nullptr;
+    accept = nullptr;
+  }
+};
 
 namespace {
 
@@ -50,10 +64,29 @@ std::string numericAddress(const sockaddr* address) {
 // is decoded and "%2F" can stand inside a variable.
 size_t keepEscapes(void*, MHD_Connection*, char* text) { return std::strlen(text); }
 
-MHD_Result collectParameter(void* list, MHD_ValueKind, const char* key, const char* value) {
-  static_cast<std::vector<RawParameter>*>(list)->push_back(
-      RawParameter{key, value != nullptr ? value : ""});
+// One walk over everything the daemon parsed; of two headers with one name
+// the first counts, as with the daemon's own look-up.
+MHD_Result collectHead(void* into, MHD_ValueKind kind, const char* key, const char* value) {
+  auto& head = *static_cast<HttpServer::RequestHead*>(into);
+  if (kind == MHD_GET_ARGUMENT_KIND) {
+    head.query.push_back(RawParameter{key, value != nullptr ? value : ""});
+  } else if (head.contentType == nullptr &&
+             strcasecmp(key, MHD_HTTP_HEADER_CONTENT_TYPE) == 0) {
+    head.contentType = value;
+  } else if (head.accept == nullptr && strcasecmp(key, MHD_HTTP_HEADER_ACCEPT) == 0) {
+    head.accept = value;
+  }
   return MHD_YES;
+}
+
+// Keeps the query list's storage for the thread's next request.
+HttpServer::RequestHead& readHead(MHD_Connection* connection) {
+  thread_local HttpServer::RequestHead head;
+  head.clear();
+  MHD_get_connection_values(connection,
+                            static_cast<MHD_ValueKind>(MHD_HEADER_KIND | MHD_GET_ARGUMENT_KIND),
+                            &collectHead, &head);
+  return head;
 }
 
 // Each pool thread runs one request at a time, so it keeps one exchange for
@@ -194,10 +227,7 @@ void HttpServer::beginStop() {
 
 void HttpServer::finishStop(std::chrono::milliseconds grace) {
   if (daemon_ == nullptr) return;
-  {
-    std::unique_lock<std::mutex> lock(drainLock_);
-    drained_.wait_for(lock, grace, [this] { return inFlight_.load() == 0; });
-  }
+  inFlight_.waitForNone(grace);
   MHD_stop_daemon(daemon_);
   daemon_ = nullptr;
 }
@@ -251,7 +281,7 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
       state->method = method;
       state->path = url;
     }
-    inFlight_.fetch_add(1);
+    inFlight_.enter();
     *requestContext = state;
     return MHD_YES;
   }
@@ -277,8 +307,7 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
   if (stopping_) return sendText(connection, state, MHD_HTTP_SERVICE_UNAVAILABLE, kUnavailable, true);
   if (state.bodyTooLarge) return sendText(connection, state, MHD_HTTP_CONTENT_TOO_LARGE, kTooLarge);
 
-  std::vector<RawParameter> query;
-  MHD_get_connection_values(connection, MHD_GET_ARGUMENT_KIND, &collectParameter, &query);
+  const RequestHead& head = readHead(connection);
   ws::runtime::Exchange& exchange = threadExchange();
   // A fresh identifier and empty buffers on every way out, so an identifier
   // kept by a plug-in past its Run is refused from then on.
@@ -287,7 +316,7 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
     ~Renew() { exchange.reset(); }
   } renew{exchange};
   ws::runtime::ExchangeRequest& request = exchange.request();
-  switch (mapUrl(options_.service, url, query, request)) {
+  switch (mapUrl(options_.service, url, head.query, request)) {
     case Mapping::kNotFound:
       return sendText(connection, state, MHD_HTTP_NOT_FOUND, kNotFound);
     case Mapping::kBadRequest:
@@ -295,21 +324,16 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
     case Mapping::kMapped:
       break;
   }
-  return runPlugin(connection, state, method, exchange);
+  return runPlugin(connection, state, method, head, exchange);
 }
 
 MHD_Result HttpServer::runPlugin(MHD_Connection* connection, Connection& state,
-                                 const char* method, ws::runtime::Exchange& exchange) {
+                                 const char* method, const RequestHead& head,
+                                 ws::runtime::Exchange& exchange) {
   ws::runtime::ExchangeRequest& request = exchange.request();
   request.method = method;
-  if (const char* type = MHD_lookup_connection_value(connection, MHD_HEADER_KIND,
-                                                     MHD_HTTP_HEADER_CONTENT_TYPE)) {
-    request.setContentType(type);
-  }
-  if (const char* accept =
-          MHD_lookup_connection_value(connection, MHD_HEADER_KIND, MHD_HTTP_HEADER_ACCEPT)) {
-    request.setAccept(accept);
-  }
+  if (head.contentType != nullptr) request.setContentType(head.contentType);
+  if (head.accept != nullptr) request.setAccept(head.accept);
   request.clientAddress = state.clientWide;
   // Swapping keeps both buffers' storage for the connection's next request.
   request.body.swap(state.body);
@@ -333,10 +357,7 @@ void HttpServer::requestDone(Connection& state) {
                     .count());
   }
   state.finish();
-  if (inFlight_.fetch_sub(1) == 1 && stopping_) {
-    std::lock_guard<std::mutex> lock(drainLock_);
-    drained_.notify_all();
-  }
+  inFlight_.leave();
 }
 
 }  // namespace ws::host

@@ -9,14 +9,13 @@
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
-#include <mutex>
 #include <string>
 
 #include <microhttpd.h>
 
 #include "access_log.h"
+#include "in_flight.h"
 #include "options.h"
 #include "plugin.h"
 #include "ws_runtime/exchange.h"
@@ -44,6 +43,7 @@ class HttpServer {
   void finishStop(std::chrono::milliseconds grace);
 
   class Connection;  // per-connection state, reused across keep-alive requests
+  struct RequestHead;  // the query and the headers the plug-in may read
 
  private:
   MHD_Result answer(MHD_Connection* connection, const char* url, const char* method,
@@ -51,7 +51,7 @@ class HttpServer {
   MHD_Result respond(MHD_Connection* connection, Connection& state, const char* url,
                      const char* method);
   MHD_Result runPlugin(MHD_Connection* connection, Connection& state, const char* method,
-                       ws::runtime::Exchange& exchange);
+                       const RequestHead& head, ws::runtime::Exchange& exchange);
   void requestDone(Connection& state);
 
   static MHD_Result onRequest(void* self, MHD_Connection* connection, const char* url,
@@ -67,9 +67,7 @@ class HttpServer {
   const AccessLog& log_;
   MHD_Daemon* daemon_ = nullptr;
   std::atomic<bool> stopping_{false};
-  std::atomic<int> inFlight_{0};
-  std::mutex drainLock_;
-  std::condition_variable drained_;
+  InFlight inFlight_;
 };
 
 }  // namespace ws::host

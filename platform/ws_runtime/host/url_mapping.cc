@@ -122,12 +122,21 @@ Mapping mapUrl(std::string_view service, std::string_view rawPath,
   // and the request's own strings are decoded into in place, so a mapping
   // allocates nothing once warm.
   thread_local std::string scratch;
+  thread_local std::u32string path;
   thread_local std::u32string checked;
   if (!namesService(raw[0], service, scratch)) return Mapping::kNotFound;
   if (count != kCommandOnly && count != kWithResource) return Mapping::kNotFound;
   for (size_t i = 1; i < count; ++i) {
     if (raw[i].empty()) return Mapping::kNotFound;
-    if (!decodeComponent(raw[i], scratch, checked)) return Mapping::kBadRequest;
+  }
+  // A path without escapes or raw UTF-8 is valid as it stands and widens in
+  // one pass; any other path has each segment checked before anything is
+  // written.
+  const bool plain = widenPlain(rawPath, path);
+  if (!plain) {
+    for (size_t i = 1; i < count; ++i) {
+      if (!decodeComponent(raw[i], scratch, checked)) return Mapping::kBadRequest;
+    }
   }
   for (const RawParameter& parameter : query) {
     if (!decodeComponent(parameter.key, scratch, checked) ||
@@ -136,7 +145,11 @@ Mapping mapUrl(std::string_view service, std::string_view rawPath,
     }
   }
   // Everything decodes, so the request is written only now and in full.
-  decodeComponent(rawPath, scratch, request.path);
+  if (plain) {
+    request.path.swap(path);
+  } else {
+    decodeComponent(rawPath, scratch, request.path);
+  }
   decodeComponent(raw[1], scratch, request.command);
   request.variables.clear();
   for (size_t i = 2; i < count; ++i) {
