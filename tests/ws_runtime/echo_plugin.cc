@@ -133,8 +133,9 @@ void fixed(const ws::runtime::RequestInfo& info, uint32_t id) {
   ReadRequestVariable_C_REST_KO_GXWS_(id, "CONTENT_TYPE", types[0], &length);
   length = sizeof types[1];
   ReadRequestVariable_C_REST_KO_GXWS_(id, "ACCEPT", types[1], &length);
+  static const std::u32string kResourceType = U"resourceType";
   std::u32string value;
-  info.lookupVariable(U"resourceType", value);
+  info.lookupVariable(kResourceType, value);
   WriteOutput_C_REST_KO_GXWS_(id, kFixedDocument, sizeof kFixedDocument - 1);
   FlushOutput_KO_GXWS_(id);
   SetHTTPResponseMimeType_C_REST_KO_GXWS_(id, "vnd.ko.syncDomain.v0/json; charset=utf-8");
@@ -149,14 +150,16 @@ ECHO_EXPORT void echoFinalize() { appendToLog("finalize\n"); }
 
 ECHO_EXPORT void echoRun(ws::runtime::RequestInfo* info, uint32_t id) {
   const std::u32string& command = info->command();
-  if (command == U"echo") {
+  // The benchmarks' commands first, so that finding them adds least to what
+  // the benchmarks measure.
+  if (command == U"resources" || command == U"fixed") {
+    fixed(*info, id);
+  } else if (command == U"echo") {
     echo(*info, id);
   } else if (command == U"status") {
     status(*info, id);
   } else if (command == U"gate") {
     gate(id);
-  } else if (command == U"fixed" || command == U"resources") {
-    fixed(*info, id);
   } else if (command != U"silent") {
     SetHTTPResponseCode_KO_GXWS_(id, 404);
   }
