@@ -70,11 +70,21 @@ MHD_Result collectHead(void* into, MHD_ValueKind kind, const char* key, const ch
   auto& head = *static_cast<HttpServer::RequestHead*>(into);
   if (kind == MHD_GET_ARGUMENT_KIND) {
     head.query.push_back(RawParameter{key, value != nullptr ? value : ""});
-  } else if (head.contentType == nullptr &&
-             strcasecmp(key, MHD_HTTP_HEADER_CONTENT_TYPE) == 0) {
-    head.contentType = value;
-  } else if (head.accept == nullptr && strcasecmp(key, MHD_HTTP_HEADER_ACCEPT) == 0) {
-    head.accept = value;
+    return MHD_YES;
+  }
+  // The first letter settles most headers (Host, User-Agent, ...) without a
+  // whole comparison.
+  switch (key[0] | 0x20) {
+    case 'c':
+      if (head.contentType == nullptr && strcasecmp(key, MHD_HTTP_HEADER_CONTENT_TYPE) == 0) {
+        head.contentType = value;
+      }
+      break;
+    case 'a':
+      if (head.accept == nullptr && strcasecmp(key, MHD_HTTP_HEADER_ACCEPT) == 0) {
+        head.accept = value;
+      }
+      break;
   }
   return MHD_YES;
 }
