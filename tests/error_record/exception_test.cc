@@ -5,11 +5,13 @@
 
 #include "error_record/error.h"
 #include "error_record/exception.h"
-#include "error_record/record_checks.h"
+#include "support/raised.h"
 
 namespace {
 
 using koerr::Status;
+using quillon::test_support::Raised;
+using quillon::test_support::raisedBy;
 
 TEST(Exception, CopyMovesTheRecordAndWhatFollowsIt) {
   koerr::Exception empty;
@@ -34,14 +36,13 @@ TEST(Exception, CopyMovesTheRecordAndWhatFollowsIt) {
 }
 
 TEST(StatusGuard, ThrowsItsErrorOnlyWhenNothingElseIsInFlight) {
-  try {
+  const Raised raised = raisedBy([] {
     koerr::StatusGuard guard;
     koerr::Report(guard, koerr::koapalerr_osFault, "x/y", 3);
-  } catch (const koerr::ExceptionBase& caught) {
-    EXPECT_EQ(caught.code(), -52008);
-    EXPECT_STREQ(caught.what(),
-                 R"({"error_constant":"koapalerr_osFault","file":"x/y","line":3,"component":"quillon"})");
-  }
+  });
+  EXPECT_EQ(raised.code, -52008);
+  EXPECT_EQ(raised.record,
+            R"({"error_constant":"koapalerr_osFault","file":"x/y","line":3,"component":"quillon"})");
 
   // A warning is no error: leaving scope is quiet.
   EXPECT_NO_THROW({
@@ -60,21 +61,16 @@ TEST(StatusGuard, ThrowsItsErrorOnlyWhenNothingElseIsInFlight) {
 }
 
 TEST(ErrorHelpers, WriteTheStandardMembersInOrder) {
-  try {
+  const Raised raised = raisedBy([] {
     koerr::Error(koerr::koapalerr_resourceNotFound, "quillon/ResourceManager", 75,
                  "kosyncdomain_debug")
-        .add("message", "m")
-        .addUInt("n", 3u)
-        .addRaw("list", "[\"a\"]")
-        .raise();
-    FAIL() << "raise() returned";
-  } catch (const koerr::ExceptionBase& e) {
-    EXPECT_EQ(e.code(), -52006);
-    EXPECT_STREQ(e.what(),
-                 R"({"error_constant":"koapalerr_resourceNotFound","file":"quillon/ResourceManager",)"
-                 R"("line":75,"component":"quillon","kosyncdomain_debug":{"message":"m","n":3,)"
-                 R"("list":["a"]}})");
-  }
+        .add("message", "m").addUInt("n", 3u).addRaw("list", "[\"a\"]").raise();
+  });
+  EXPECT_EQ(raised.code, -52006);
+  EXPECT_EQ(raised.record,
+            R"({"error_constant":"koapalerr_resourceNotFound","file":"quillon/ResourceManager",)"
+            R"("line":75,"component":"quillon","kosyncdomain_debug":{"message":"m","n":3,)"
+            R"("list":["a"]}})");
 
   Status status;
   koerr::Report(status, koerr::koapalerr_invalidParameter, "kodynlib/dynload", 64)
