@@ -12,7 +12,6 @@ namespace {
 
 using answers_test::errnoMember;
 using answers_test::OwnedStatus;
-using answers_test::parses;
 using answers_test::ScopedEnv;
 using answers_test::ScratchDir;
 
@@ -127,7 +126,6 @@ TEST(ErrorsParserTest, MalformedFilesAreReportedExactly) {
     OwnedStatus status;
     EXPECT_EQ(lookupIn(path, 1, status), "");
     EXPECT_EQ(status.code, -52006);
-    EXPECT_TRUE(parses(status.text()));
     EXPECT_EQ(status.text(), c.expected);
   }
 }
@@ -226,7 +224,6 @@ TEST(ErrorsParserTest, DirectoryFailuresStopTheLookup) {
     koxlator::lookupExplanation(errors, 2, c.language, text, status);
     EXPECT_EQ(text, "");
     EXPECT_LT(status.code, 0);
-    EXPECT_TRUE(parses(status.text()));
     EXPECT_EQ(status.text(), c.expected);
   }
 }
