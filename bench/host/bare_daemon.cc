@@ -1,13 +1,14 @@
 // The floor under the host: libmicrohttpd alone, configured as ws-runtime
 // configures it (epoll, a pool of threads accepting for themselves, the
 // answer queued on the handler's last call, the same connection memory) but
-// without the host's idle timeout, which libmicrohttpd pays for on every
-// request; it serves one fixed answer with no plug-in, no URL mapping and no
-// per-request state. bench/host/run.sh
-// measures the host against it, so that what the host adds is seen apart
-// from what the machine and the library allow.
+// by default without the host's idle timeout, which libmicrohttpd pays for on
+// every request; it serves one fixed answer with no plug-in, no URL mapping
+// and no per-request state. bench/host/run.sh measures the host against it,
+// so that what the host adds is seen apart from what the machine and the
+// library allow; bench/host/instructions.sh also runs it with the host's
+// idle timeout, so that the host's own work is seen apart from the library's.
 //
-//   bare-http-daemon PORT THREADS FILE CONTENT-TYPE
+//   bare-http-daemon PORT THREADS FILE CONTENT-TYPE [IDLE-TIMEOUT-SECONDS]
 #include <microhttpd.h>
 #include <signal.h>
 
@@ -48,8 +49,9 @@ MHD_Result serve(void* context, MHD_Connection* connection, const char*, const c
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc != 5) {
-    std::fprintf(stderr, "usage: %s PORT THREADS FILE CONTENT-TYPE\n", argv[0]);
+  if (argc != 5 && argc != 6) {
+    std::fprintf(stderr, "usage: %s PORT THREADS FILE CONTENT-TYPE [IDLE-TIMEOUT-SECONDS]\n",
+                 argv[0]);
     return 2;
   }
   std::ifstream file(argv[3], std::ios::binary);
@@ -60,6 +62,7 @@ int main(int argc, char** argv) {
   Answer answer{std::string(std::istreambuf_iterator<char>(file), {}), argv[4]};
   const auto port = static_cast<uint16_t>(std::atoi(argv[1]));
   const auto threads = static_cast<unsigned>(std::atoi(argv[2]));
+  const auto idleTimeout = static_cast<unsigned>(argc == 6 ? std::atoi(argv[5]) : 0);
 
   sigset_t stop;
   sigemptyset(&stop);
@@ -69,7 +72,7 @@ int main(int argc, char** argv) {
   MHD_Daemon* daemon = MHD_start_daemon(
       MHD_USE_EPOLL_INTERNAL_THREAD | MHD_USE_ITC | MHD_USE_TURBO, port, nullptr, nullptr, &serve,
       &answer, MHD_OPTION_THREAD_POOL_SIZE, threads, MHD_OPTION_CONNECTION_MEMORY_LIMIT,
-      static_cast<size_t>(8 * 1024), MHD_OPTION_END);
+      static_cast<size_t>(8 * 1024), MHD_OPTION_CONNECTION_TIMEOUT, idleTimeout, MHD_OPTION_END);
   if (daemon == nullptr) {
     std::fprintf(stderr, "%s: cannot start the daemon on port %u\n", argv[0], port);
     return 1;
