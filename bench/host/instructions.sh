@@ -9,7 +9,7 @@
 #   bare       libmicrohttpd alone, without it (the floor run.sh compares against)
 # Each server runs one pool thread and is run twice, for REQUESTS/6 and for
 # REQUESTS requests sent one after another on one connection, which makes the
-# counts repeat exactly; the difference divided by the difference in requests
+# counts repeat to within a few instructions; the difference divided by the difference in requests
 # leaves out start-up and shut-down. host minus bare+idle is the host's own
 # work per request (its bookkeeping, the URL mapping, the plug-in's calls into
 # the runtime); bare+idle minus bare is the idle timeout's. Kernel time (the
@@ -45,7 +45,7 @@ count() {  # requests server-args... (PORT stands for the port)
     curl -fs -o /dev/null "http://127.0.0.1:$port/echo/resources" && break
     sleep 0.1
   done
-  python3 "$root/bench/host/keepalive_client.py" "$port" /echo/resources 1 "$n"
+  python3 "$root/bench/host/keepalive_client.py" "$port" /echo/resources "$n"
   kill -INT "$pid"
   wait "$pid"
   awk '/^summary:/ { print $2 }' "$work/out"
