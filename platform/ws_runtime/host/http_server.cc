@@ -17,19 +17,6 @@
 
 namespace ws::host {
 
-// What the plug-in may read of a request's head besides its path.
-struct HttpServer::RequestHead {
-  std::vector<RawParameter> query;
-  const char* contentType = nullptr;
-  const char* accept = nullptr;
-
-  void clear() {
-    query.clear();
-    contentType = nullptr;
-    accept = nullptr;
-  }
-};
-
 namespace {
 
 using Clock = std::chrono::steady_clock;
@@ -64,10 +51,23 @@ std::string numericAddress(const sockaddr* address) {
 // is decoded and "%2F" can stand inside a variable.
 size_t keepEscapes(void*, MHD_Connection*, char* text) { return std::strlen(text); }
 
+// What the plug-in may read of a request's head besides its path.
+struct RequestHead {
+  std::vector<RawParameter> query;
+  const char* contentType = nullptr;
+  const char* accept = nullptr;
+
+  void clear() {
+    query.clear();
+    contentType = nullptr;
+    accept = nullptr;
+  }
+};
+
 // One walk over everything the daemon parsed; of two headers with one name
 // the first counts, as with the daemon's own look-up.
 MHD_Result collectHead(void* into, MHD_ValueKind kind, const char* key, const char* value) {
-  auto& head = *static_cast<HttpServer::RequestHead*>(into);
+  auto& head = *static_cast<RequestHead*>(into);
   if (kind == MHD_GET_ARGUMENT_KIND) {
     head.query.push_back(RawParameter{key, value != nullptr ? value : ""});
     return MHD_YES;
@@ -90,8 +90,8 @@ MHD_Result collectHead(void* into, MHD_ValueKind kind, const char* key, const ch
 }
 
 // Keeps the query list's storage for the thread's next request.
-HttpServer::RequestHead& readHead(MHD_Connection* connection) {
-  thread_local HttpServer::RequestHead head;
+const RequestHead& readHead(MHD_Connection* connection) {
+  thread_local RequestHead head;
   head.clear();
   MHD_get_connection_values(connection,
                             static_cast<MHD_ValueKind>(MHD_HEADER_KIND | MHD_GET_ARGUMENT_KIND),
@@ -334,16 +334,15 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
     case Mapping::kMapped:
       break;
   }
-  return runPlugin(connection, state, method, head, exchange);
+  if (head.contentType != nullptr) request.setContentType(head.contentType);
+  if (head.accept != nullptr) request.setAccept(head.accept);
+  return runPlugin(connection, state, method, exchange);
 }
 
 MHD_Result HttpServer::runPlugin(MHD_Connection* connection, Connection& state,
-                                 const char* method, const RequestHead& head,
-                                 ws::runtime::Exchange& exchange) {
+                                 const char* method, ws::runtime::Exchange& exchange) {
   ws::runtime::ExchangeRequest& request = exchange.request();
   request.method = method;
-  if (head.contentType != nullptr) request.setContentType(head.contentType);
-  if (head.accept != nullptr) request.setAccept(head.accept);
   request.clientAddress = state.clientWide;
   // Swapping keeps both buffers' storage for the connection's next request.
   request.body.swap(state.body);

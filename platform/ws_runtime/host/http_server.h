@@ -43,7 +43,6 @@ class HttpServer {
   void finishStop(std::chrono::milliseconds grace);
 
   class Connection;  // per-connection state, reused across keep-alive requests
-  struct RequestHead;  // the query and the headers the plug-in may read
 
  private:
   MHD_Result answer(MHD_Connection* connection, const char* url, const char* method,
@@ -51,7 +50,7 @@ class HttpServer {
   MHD_Result respond(MHD_Connection* connection, Connection& state, const char* url,
                      const char* method);
   MHD_Result runPlugin(MHD_Connection* connection, Connection& state, const char* method,
-                       const RequestHead& head, ws::runtime::Exchange& exchange);
+                       ws::runtime::Exchange& exchange);
   void requestDone(Connection& state);
 
   static MHD_Result onRequest(void* self, MHD_Connection* connection, const char* url,
