@@ -7,7 +7,6 @@
 
 #include <cerrno>
 #include <cstring>
-#include <map>
 #include <stdexcept>
 #include <thread>
 
@@ -19,7 +18,7 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 constexpr auto kPollInterval = std::chrono::milliseconds(5);
-constexpr auto kStartTimeout = std::chrono::seconds(30);
+constexpr auto kTimeout = std::chrono::seconds(30);
 constexpr const char* kListeningMarker = "listening on ";
 constexpr const char* kLogName = "host.log";
 
@@ -32,22 +31,16 @@ int decodeWaitStatus(int status) {
 // Starts `args` with stdout and stderr appended to `logPath`.
 pid_t spawn(const std::vector<std::string>& args, const Environment& env,
             const std::string& logPath) {
-  std::map<std::string, std::string> merged;
-  for (char** entry = environ; *entry != nullptr; ++entry) {
-    const std::string text = *entry;
-    const auto equals = text.find('=');
-    if (equals != std::string::npos) merged[text.substr(0, equals)] = text.substr(equals + 1);
-  }
-  for (const auto& [name, value] : env) merged[name] = value;
+  // The child's lookups find the first definition: the test's own come first.
   std::vector<std::string> envText;
-  for (const auto& [name, value] : merged) envText.push_back(name + "=" + value);
-
+  for (const auto& [name, value] : env) envText.push_back(name + "=" + value);
+  std::vector<char*> envp;
+  for (std::string& entry : envText) envp.push_back(entry.data());
+  for (char** entry = environ; *entry != nullptr; ++entry) envp.push_back(*entry);
+  envp.push_back(nullptr);
   std::vector<char*> argv;
   for (const std::string& arg : args) argv.push_back(const_cast<char*>(arg.c_str()));
   argv.push_back(nullptr);
-  std::vector<char*> envp;
-  for (std::string& entry : envText) envp.push_back(entry.data());
-  envp.push_back(nullptr);
 
   posix_spawn_file_actions_t actions;
   posix_spawn_file_actions_init(&actions);
@@ -75,10 +68,12 @@ pid_t spawn(const std::vector<std::string>& args, const Environment& env,
 // The port announced in the log, or 0 while there is none.
 uint16_t announcedPort(const std::string& log) {
   const auto marker = log.find(kListeningMarker);
-  if (marker == std::string::npos) return 0;
   const auto space = log.find(' ', marker + std::strlen(kListeningMarker));
   const auto colon = log.rfind(':', space);
-  if (space == std::string::npos || colon == std::string::npos || colon < marker) return 0;
+  if (marker == std::string::npos || space == std::string::npos || colon == std::string::npos ||
+      colon < marker) {
+    return 0;
+  }
   return static_cast<uint16_t>(std::stoi(log.substr(colon + 1, space - colon - 1)));
 }
 
@@ -88,7 +83,7 @@ HostProcess::HostProcess(const std::vector<std::string>& args, const Environment
   std::vector<std::string> argv = {kWsRuntimePath, "--listen", "127.0.0.1:0"};
   argv.insert(argv.end(), args.begin(), args.end());
   pid_ = spawn(argv, env, scratch_.file(kLogName));
-  const auto deadline = Clock::now() + kStartTimeout;
+  const auto deadline = Clock::now() + kTimeout;
   while (port_ == 0) {
     int status = 0;
     if (::waitpid(pid_, &status, WNOHANG) == pid_) {
@@ -132,8 +127,8 @@ int HostProcess::stop(int signal) {
 
 std::string HostProcess::log() const { return scratch_.read(kLogName); }
 
-bool HostProcess::waitForLog(const std::string& text, std::chrono::milliseconds timeout) const {
-  const auto deadline = Clock::now() + timeout;
+bool HostProcess::waitForLog(const std::string& text) const {
+  const auto deadline = Clock::now() + kTimeout;
   while (log().find(text) == std::string::npos) {
     if (Clock::now() > deadline) return false;
     std::this_thread::sleep_for(kPollInterval);
@@ -141,14 +136,13 @@ bool HostProcess::waitForLog(const std::string& text, std::chrono::milliseconds 
   return true;
 }
 
-HostRun runHostToExit(const std::vector<std::string>& args, const Environment& env,
-                      std::chrono::milliseconds timeout) {
+HostRun runHostToExit(const std::vector<std::string>& args) {
   const answers_test::ScratchDir scratch;
   std::vector<std::string> argv = {kWsRuntimePath};
   argv.insert(argv.end(), args.begin(), args.end());
-  const pid_t pid = spawn(argv, env, scratch.file(kLogName));
+  const pid_t pid = spawn(argv, {}, scratch.file(kLogName));
   int status = 0;
-  for (const auto deadline = Clock::now() + timeout; ::waitpid(pid, &status, WNOHANG) != pid;) {
+  for (const auto deadline = Clock::now() + kTimeout; ::waitpid(pid, &status, WNOHANG) != pid;) {
     if (Clock::now() > deadline) ::kill(pid, SIGKILL);  // reaped on the next turn
     std::this_thread::sleep_for(kPollInterval);
   }

@@ -3,19 +3,17 @@
 #include <arpa/inet.h>
 #include <netinet/in.h>
 #include <netinet/tcp.h>
+#include <strings.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstring>
 #include <stdexcept>
-#include <strings.h>
 
 namespace quillon::test_support {
 
 namespace {
-
-constexpr int kTimeoutSeconds = 30;
 
 [[noreturn]] void fail(const std::string& what) {
   throw std::runtime_error("http client: " + what);
@@ -36,18 +34,17 @@ std::optional<std::string> HttpResponse::header(std::string_view name) const {
   return findHeader(headers, name);
 }
 
-HttpClient::HttpClient(uint16_t port) {
-  sockaddr_in target{};
-  target.sin_family = AF_INET;
-  target.sin_port = htons(port);
-  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  fd_ = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+HttpClient::HttpClient(uint16_t port) : fd_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
   if (fd_ < 0) fail(std::string("socket: ") + std::strerror(errno));
-  timeval timeout{kTimeoutSeconds, 0};
+  const timeval timeout{30, 0};
   ::setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
   ::setsockopt(fd_, SOL_SOCKET, SO_SNDTIMEO, &timeout, sizeof timeout);
   const int on = 1;
   ::setsockopt(fd_, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
+  sockaddr_in target{};
+  target.sin_family = AF_INET;
+  target.sin_port = htons(port);
+  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
   if (::connect(fd_, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
     const std::string reason = std::strerror(errno);
     ::close(fd_);
@@ -55,9 +52,7 @@ HttpClient::HttpClient(uint16_t port) {
   }
 }
 
-HttpClient::~HttpClient() {
-  if (fd_ >= 0) ::close(fd_);
-}
+HttpClient::~HttpClient() { ::close(fd_); }
 
 bool HttpClient::fill() {
   char chunk[16384];
@@ -67,30 +62,26 @@ bool HttpClient::fill() {
       buffer_.append(chunk, static_cast<size_t>(got));
       return true;
     }
-    if (got == 0) return false;
-    if (errno == EINTR) continue;
-    if (errno == ECONNRESET) return false;
-    fail(std::string("recv: ") + std::strerror(errno));
+    if (got == 0 || errno == ECONNRESET) return false;
+    if (errno != EINTR) fail(std::string("recv: ") + std::strerror(errno));
   }
 }
 
-std::string HttpClient::readLine() {
-  size_t end;
-  while ((end = buffer_.find("\r\n")) == std::string::npos) {
-    if (!fill()) fail("connection closed inside the answer's head");
-  }
-  std::string line = buffer_.substr(0, end);
-  buffer_.erase(0, end + 2);
-  return line;
-}
-
-std::string HttpClient::readExactly(size_t size) {
+std::string HttpClient::take(size_t size) {
   while (buffer_.size() < size) {
-    if (!fill()) fail("connection closed inside the answer's body");
+    if (!fill()) fail("connection closed inside an answer");
   }
   std::string data = buffer_.substr(0, size);
   buffer_.erase(0, size);
   return data;
+}
+
+std::string HttpClient::readLine() {
+  while (buffer_.find("\r\n") == std::string::npos) {
+    if (!fill()) fail("connection closed inside an answer's head");
+  }
+  const std::string line = take(buffer_.find("\r\n") + 2);
+  return line.substr(0, line.size() - 2);
 }
 
 HttpResponse HttpClient::send(const HttpRequest& request) {
@@ -103,13 +94,11 @@ HttpResponse HttpClient::send(const HttpRequest& request) {
       (!request.body.empty() || request.method == "PUT" || request.method == "POST")) {
     text += "Content-Length: " + std::to_string(request.body.size()) + "\r\n";
   }
-  text += "\r\n";
-  text += request.body;
+  text += "\r\n" + request.body;
   for (size_t sent = 0; sent < text.size();) {
     const ssize_t put = ::send(fd_, text.data() + sent, text.size() - sent, MSG_NOSIGNAL);
-    if (put < 0 && errno == EINTR) continue;
-    if (put < 0) fail(std::string("send: ") + std::strerror(errno));
-    sent += static_cast<size_t>(put);
+    if (put < 0 && errno != EINTR) fail(std::string("send: ") + std::strerror(errno));
+    if (put > 0) sent += static_cast<size_t>(put);
   }
 
   HttpResponse response;
@@ -125,21 +114,16 @@ HttpResponse HttpClient::send(const HttpRequest& request) {
     response.headers.emplace_back(line.substr(0, colon),
                                   valueStart == std::string::npos ? "" : line.substr(valueStart));
   }
-
-  // The host answers from a buffer, so every answer it sends has a length.
-  const auto length = response.header("Content-Length");
-  const bool noBody = response.status == 204 || response.status == 304;
-  if (length) {
-    response.body = readExactly(std::stoul(*length));
-  } else if (!noBody) {
+  if (const auto length = response.header("Content-Length")) {
+    response.body = take(std::stoul(*length));
+  } else {  // the answer ends with the connection
     while (fill()) {
     }
     response.body.swap(buffer_);
     closed_ = true;
   }
   const auto connection = response.header("Connection");
-  const bool closeAfter = connection && ::strcasecmp(connection->c_str(), "close") == 0;
-  if (closeAfter) closed_ = true;
+  if (connection && ::strcasecmp(connection->c_str(), "close") == 0) closed_ = true;
   return response;
 }
 

@@ -1,6 +1,5 @@
 // A small blocking HTTP/1.1 client for end-to-end tests: one keep-alive
 // connection to a loopback port, one request at a time, whole answers.
-//
 // Thread-safety: one client per thread.
 #ifndef QUILLON_TESTS_SUPPORT_HTTP_CLIENT_H_
 #define QUILLON_TESTS_SUPPORT_HTTP_CLIENT_H_
@@ -18,38 +17,36 @@ using HeaderList = std::vector<std::pair<std::string, std::string>>;
 
 struct HttpRequest {
   std::string method = "GET";  // any but HEAD: answers are read by their length
-  std::string target = "/";  // path and query, sent as is
-  HeaderList headers;        // Host and Content-Length are added unless given
+  std::string target = "/";    // path and query, sent as is
+  HeaderList headers;          // Host and Content-Length are added unless given
   std::string body;
 };
 
 struct HttpResponse {
   int status = 0;
-  HeaderList headers;  // in the order received
+  HeaderList headers;
   std::string body;
-
   // The first header of that name (case-insensitive).
   std::optional<std::string> header(std::string_view name) const;
 };
 
 class HttpClient {
  public:
-  // Connects to 127.0.0.1:`port`. Throws std::runtime_error on failure.
+  // Connects to 127.0.0.1:`port`; every failure, and no answer within 30 s,
+  // throws std::runtime_error.
   explicit HttpClient(uint16_t port);
   ~HttpClient();
   HttpClient(const HttpClient&) = delete;
   HttpClient& operator=(const HttpClient&) = delete;
 
-  // Sends the request and reads the whole answer. Throws std::runtime_error
-  // on a connection error, a malformed answer or no answer within 30 s.
   HttpResponse send(const HttpRequest& request);
   // Whether the server closed the connection after the last answer.
   bool closedByServer() const { return closed_; }
 
  private:
-  bool fill();  // reads more into buffer_; false at end of stream
+  bool fill();  // false at end of stream
+  std::string take(size_t size);
   std::string readLine();
-  std::string readExactly(size_t size);
 
   int fd_ = -1;
   std::string buffer_;
