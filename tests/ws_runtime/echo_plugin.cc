@@ -1,18 +1,13 @@
 // A plug-in for the host's own tests and benchmarks, mounted with
 // "--service echo". Commands:
-//   echo    writes back, one "key=value" line each, what it can read of the
-//           request (method, headers, command, path, client, variables, body)
-//   status  sets the code from the variable "code" and, when given, the MIME
-//           type from "mime"
-//   silent  sets and writes nothing
-//   gate    blocks until the FIFO named by ECHO_PLUGIN_GATE reaches end of
-//           file, then answers "released"
+//   echo    writes back, a "key=value" line each, what it reads of the request
+//   status  sets the code from the variable "code", the MIME type from "mime"
+//   gate    answers "released" once the FIFO named by ECHO_PLUGIN_GATE ends
 //   fixed, resources
-//           read the request the way a real service does and answer a fixed
+//           read the request as a real service does and answer a fixed
 //           200-byte JSON document at once (the benchmarks' immediate plug-in)
-// Init and Finalize append "init" and "finalize" lines to the file named by
-// ECHO_PLUGIN_LOG, so a test can see that each ran once; "gate" appends
-// "gate-entered" and "gate-left".
+// Init, Finalize and "gate" append lines to the file named by ECHO_PLUGIN_LOG,
+// so a test can see what ran, and how often.
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -58,8 +53,7 @@ std::string readVariable(uint32_t id, const char* name) {
 
 std::string readBody(uint32_t id) {
   uint32_t length = 0;
-  const int32_t probe = ReadPostData_C_REST_KO_GXWS_(id, nullptr, &length);
-  if (probe < 0) return "<error " + std::to_string(probe) + ">";
+  if (ReadPostData_C_REST_KO_GXWS_(id, nullptr, &length) < 0) return "<error>";
   std::string body(length, '\0');
   if (length > 0 && ReadPostData_C_REST_KO_GXWS_(id, body.data(), &length) != 0) return "<error>";
   return body;
@@ -160,7 +154,7 @@ ECHO_EXPORT void echoRun(ws::runtime::RequestInfo* info, uint32_t id) {
     status(*info, id);
   } else if (command == U"gate") {
     gate(id);
-  } else if (command != U"silent") {
+  } else {
     SetHTTPResponseCode_KO_GXWS_(id, 404);
   }
 }

