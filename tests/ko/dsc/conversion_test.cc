@@ -30,14 +30,9 @@ TEST(SafeInteger, ConvertsWhatFitsAndRaisesOutOfRangeWithTheLimitsOtherwise) {
        nullptr},
       {"-1 to uint64", [] { return static_cast<long long>(S::convert<uint64_t>(-1)); }, false, 0,
        "Out of range: -1 is not within [0, 18446744073709551615]"},
-      {"256 to uint8", [] { return S::convert<uint8_t>(256); }, false, 0,
-       "Out of range: 256 is not within [0, 255]"},
       {"255 to uint8", [] { return S::convert<uint8_t>(255U); }, true, 255, nullptr},
       {"uint32 max to int32", [] { return S::convert<int32_t>(uint32_t{UINT32_MAX}); }, false, 0,
        "Out of range: 4294967295 is not within [-2147483648, 2147483647]"},
-      {"uint64 max to int64", [] { return S::convert<int64_t>(uint64_t{UINT64_MAX}); }, false, 0,
-       "Out of range: 18446744073709551615 is not within [-9223372036854775808, "
-       "9223372036854775807]"},
       {"int32 max to uint32", [] { return S::convert<uint32_t>(INT32_MAX); }, true, INT32_MAX,
        nullptr},
   };
@@ -80,8 +75,6 @@ TEST(IConv, RoundTripsAndReportsWhereConversionFails) {
        "unconvertible character at offset 1 converting US-ASCII to WCHAR_T"},
       {"truncated utf-8", [&] { (void)utf8.widen("ab\xc3"); },
        "incomplete character at offset 2 converting UTF-8 to WCHAR_T"},
-      {"invalid utf-8", [&] { (void)utf8.widen("\x80z"); },
-       "unconvertible character at offset 0 converting UTF-8 to WCHAR_T"},
   };
   for (const auto& f : failures) {
     SCOPED_TRACE(f.name);

@@ -31,33 +31,23 @@ TEST(LibrarySearchPath, ComponentFolderFirstThenDirectoryThenTheSystemLoader) {
   EXPECT_EQ(LibrarySearchPath::fromEnvironment().locate("kocurl", "libx.so.13"), "libx.so.13");
 }
 
-TEST(SharedLibrary, ResolvesSymbolsAndRaisesOSExceptionWithTheLoaderText) {
+// The loader's own failure texts reach the binding's scenario tests; what
+// they cannot reach is a symbol asked of a library that did not load.
+TEST(SharedLibrary, ResolvesSymbolsAndRaisesOSExceptionWhenNotLoaded) {
   const SharedLibrary math(L"system", L"m", 6, LibrarySearchPath());
   ASSERT_TRUE(math.isLoaded()) << math.loaderError();
   EXPECT_EQ(math.path(), "libm.so.6");
-  auto* cosine = reinterpret_cast<double (*)(double)>(math.symbol("cos"));
-  EXPECT_DOUBLE_EQ(cosine(0.0), 1.0);
-  try {
-    (void)math.symbol("no_such_symbol_here");
-    FAIL() << "no exception";
-  } catch (const OSException& e) {
-    EXPECT_EQ(e.code(), -52008);
-    EXPECT_STREQ(e.file(), "ko/dsc/osdep/SharedLibrary");
-    EXPECT_EQ(std::string(e.what()).rfind("dlsym(no_such_symbol_here) in libm.so.6: ", 0), 0u)
-        << e.what();
-  }
+  EXPECT_DOUBLE_EQ(reinterpret_cast<double (*)(double)>(math.symbol("cos"))(0.0), 1.0);
 
   const SharedLibrary absent(L"kocurl", L"ko_dsc_absent", 13, LibrarySearchPath());
   EXPECT_FALSE(absent.isLoaded());
-  EXPECT_EQ(absent.loaderError().rfind("dlopen(libko_dsc_absent.so.13): ", 0), 0u)
-      << absent.loaderError();
   try {
     (void)absent.symbol("curl_easy_init");
     FAIL() << "no exception";
   } catch (const OSException& e) {
-    EXPECT_EQ(std::string(e.what()).rfind("dlsym(curl_easy_init): library kocurl not loaded: dlopen(", 0),
-              0u)
-        << e.what();
+    EXPECT_EQ(e.code(), -52008);
+    EXPECT_EQ(std::string(e.what()),
+              "dlsym(curl_easy_init): library kocurl not loaded: " + absent.loaderError());
   }
 }
 
