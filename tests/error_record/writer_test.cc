@@ -11,7 +11,6 @@ namespace {
 
 using koerr::Status;
 using koerr_test::holdsInvariant;
-using koerr_test::parse;
 
 TEST(Writers, WriteEveryKindInOrderAndNest) {
   Status status;
@@ -41,58 +40,29 @@ TEST(Writers, WriteEveryKindInOrderAndNest) {
   koerr::releaseText(status);
 }
 
+// One row per escaping rule: the short forms, \u00XX (0x7f included) and
+// bytes that pass unchanged.
 TEST(Writers, EscapeKeysAndValues) {
   struct Case {
     std::string raw;
     const char* written;
   };
   const std::vector<Case> cases = {
-      {"quote\"", R"("quote\"")"},
-      {"back\\slash", R"("back\\slash")"},
-      {"\b\f\n\r\t", R"("\b\f\n\r\t")"},
-      {"\x01", R"("\u0001")"},
-      {"\x1f", R"("\u001f")"},
-      {"\x7f", R"("\u007f")"},
-      {"\v", R"("\u000b")"},
+      {"q\"b\\\b\f\n\r\t", R"("q\"b\\\b\f\n\r\t")"},
+      {"\x01\x1f\v\x7f", R"("\u0001\u001f\u000b\u007f")"},
       {"caf\xc3\xa9", "\"caf\xc3\xa9\""},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.written);
     Status status;
     koerr::addStdString(koerr::beginJson(status, 2), c.raw.c_str(), c.raw, status);
-    const std::string expected = std::string("{") + c.written + ":" + c.written + "}";
-    EXPECT_EQ(status.json, expected);
-    ASSERT_TRUE(holdsInvariant(status));
-    koerr_test::JsonPtr root = parse(status.json);
-    const cJSON* member = cJSON_GetObjectItemCaseSensitive(root.get(), c.raw.c_str());
-    ASSERT_NE(member, nullptr);
-    EXPECT_EQ(std::string(member->valuestring), c.raw);
+    EXPECT_EQ(status.json, std::string("{") + c.written + ":" + c.written + "}");
+    EXPECT_TRUE(holdsInvariant(status));
     std::string appended = "<";
     koerr::appendJsonEscaped(appended, c.raw);
     EXPECT_EQ(appended, "<" + std::string(c.written + 1, std::strlen(c.written) - 2));
     koerr::releaseText(status);
   }
-}
-
-TEST(Writers, GrowPastTheFirstBufferKeepingEveryMember) {
-  Status status;
-  char* c = koerr::beginJson(status, 2);
-  ASSERT_EQ(status.capacity, 512u);
-  const std::string value(100, 'v');
-  for (int i = 0; i < 6; ++i) {
-    c = koerr::addStdString(c, ("m" + std::to_string(i)).c_str(), value, status);
-  }
-  EXPECT_EQ(status.capacity, 1024u);
-  EXPECT_EQ(status.json[1023], 'J');
-  ASSERT_TRUE(holdsInvariant(status));
-  koerr_test::JsonPtr root = parse(status.json);
-  int index = 0;
-  for (const cJSON* m = root->child; m != nullptr; m = m->next, ++index) {
-    EXPECT_EQ(std::string(m->string), "m" + std::to_string(index));
-    EXPECT_EQ(std::string(m->valuestring), value);
-  }
-  EXPECT_EQ(index, 6);
-  koerr::releaseText(status);
 }
 
 // Fails the Nth allocation: every failure must leave a shorter valid record.
@@ -119,6 +89,7 @@ std::string buildLargeRecord(Status& status) {
   return c != nullptr ? "complete" : "short";
 }
 
+// The complete record grows through several buffers and keeps every member.
 TEST(Writers, AllocationFailureAtEveryStepLeavesValidShorterJson) {
   FailingAllocator::failAt = 0;
   FailingAllocator::calls = 0;
@@ -128,6 +99,11 @@ TEST(Writers, AllocationFailureAtEveryStepLeavesValidShorterJson) {
   const int allocations = FailingAllocator::calls;
   ASSERT_GE(allocations, 4);
   const std::string full = reference.json;
+  std::string expected = R"({"error_constant":"koapalerr_resourceNotFound","quillon_debug":{)";
+  for (int i = 0; i < 12; ++i) {
+    expected += (i ? ",\"line" : "\"line") + std::to_string(i) + "\":\"" + std::string(300, 'x') + "\"";
+  }
+  EXPECT_EQ(full, expected + R"(},"last":"y"})");
 
   for (int n = 1; n <= allocations + 1; ++n) {
     SCOPED_TRACE("failing allocation " + std::to_string(n));
@@ -138,10 +114,9 @@ TEST(Writers, AllocationFailureAtEveryStepLeavesValidShorterJson) {
     const std::string outcome = buildLargeRecord(status);
     EXPECT_EQ(outcome, n > allocations ? "complete" : "short");
     EXPECT_TRUE(holdsInvariant(status));
+    // Shorter, never longer: a failed member leaves no trace.
     if (status.json != nullptr) {
-      // Shorter, never different: what survived is a prefix of the members.
-      const std::string text = status.json;
-      EXPECT_LE(text.size(), full.size());
+      EXPECT_LE(std::string(status.json).size(), full.size());
     }
     koerr::releaseText(status);
   }
