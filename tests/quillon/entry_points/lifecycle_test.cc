@@ -95,11 +95,15 @@ TEST_F(LifecycleTest, FinalizeReleasesTheGraphOnceAndANewInitMakesANewWrapper) {
   EXPECT_NE(lifecycle.wrapper(), nullptr);
 }
 
-// Answers before and after Init are checked through the built library
-// (PluginLibrary.LifecycleOverThePlatformStandIns) and over HTTP.
-TEST_F(LifecycleTest, RunSurvivesBadRequests) {
-  lifecycle.init();
+// Answers after Init are checked over HTTP, where the host loads the built
+// library; outside Init the service is unavailable.
+TEST_F(LifecycleTest, RunAnswers503OutsideInitAndSurvivesBadRequests) {
   ws::runtime::Exchange exchange;
+  lifecycle.run(exchange.info(), exchange.id());
+  EXPECT_EQ(exchange.response().code, 503);
+
+  lifecycle.init();
+  exchange.reset();
   // A null request object answers nothing and returns normally.
   lifecycle.run(nullptr, exchange.id());
   EXPECT_EQ(exchange.response().code, 200);
@@ -111,6 +115,11 @@ TEST_F(LifecycleTest, RunSurvivesBadRequests) {
   exchange.reset();
   lifecycle.run(exchange.info(), stale);
   EXPECT_TRUE(exchange.response().body.empty());
+
+  lifecycle.finalize();
+  exchange.reset();
+  lifecycle.run(exchange.info(), exchange.id());
+  EXPECT_EQ(exchange.response().code, 503);
 }
 
 }  // namespace
