@@ -9,7 +9,6 @@
 #include "kojsonlh/array_iterator.h"
 #include "kojsonlh/cjson_utils.h"
 #include "kojsonlh/cpp_json.h"
-#include "kosynctools_cjson/json_helper_functions.h"
 #include "support/raised.h"
 
 namespace {
@@ -58,12 +57,6 @@ TEST(JsonLayer, ArraysAreWalkedInOrderAndNotPastTheEnd) {
       headOnly(-52004, "jsonErrorsArrayItemOutOfBounds", "kojsonlh/ArrayIterator", 47);
   EXPECT_EQ(thrownBy([&] { (void)elements.at(3); }), outOfBounds);
   EXPECT_EQ(thrownBy([&] { (void)elements.next(); }), outOfBounds);
-
-  CppJson empty("[]");
-  EXPECT_EQ(thrownBy([&] { (void)ArrayIterator(empty.get()).at(0); }), outOfBounds);
-  CppJson object("{}");
-  EXPECT_EQ(thrownBy([&] { ArrayIterator notAnArray(object.get()); }),
-            headOnly(-52004, "jsonErrorsNotAnArray", "kojsonlh/cJSONUtils", 83));
 }
 
 TEST(JsonLayer, HolderOwnsExactlyOneTreeAtATime) {
@@ -76,21 +69,6 @@ TEST(JsonLayer, HolderOwnsExactlyOneTreeAtATime) {
   EXPECT_EQ(cJSON_GetArrayItem(moved.get(), 0)->valuedouble, 3);
   moved.reset();
   EXPECT_EQ(moved.get(), nullptr);
-}
-
-TEST(JsonLayer, TypeMismatchesAreReportedWithTheAnswerAndKey) {
-  const std::string answer = "{\"gm\":[\"x\"]}";
-  CppJson document(answer);
-  const cJSON* gm = cJSONUtils::getObjectItem(document.get(), "gm");
-  EXPECT_EQ(thrownBy([&] { (void)kosynctools::cjson::getStringValue(gm, answer, "gm"); }),
-            "-52004 {\"error_constant\":\"errCode\",\"file\":\"kosynctools_cjson/"
-            "jsonHelperFunctions\",\"line\":50,\"component\":\"quillon\",\"kosync_debug\":"
-            "{\"message\":\"Error parsing: expected data type does not match the parsed value.\","
-            "\"JSON\":\"{\\\"gm\\\":[\\\"x\\\"]}\",\"key\":\"gm\"}}");
-  CppJson text("{\"gm\":\"x\"}");
-  EXPECT_EQ(kosynctools::cjson::getStringValue(
-                cJSONUtils::getObjectItem(text.get(), "gm"), "unused", "gm"),
-            "x");
 }
 
 }  // namespace
