@@ -24,8 +24,7 @@ TEST(FindMember, ReachesMembersPastNestedValues) {
   };
   const std::vector<Case> cases = {
       {"error_constant", "\"x\""}, {"code", "-1074100990"}, {"esc\"aped", "\"\\u00e9"},
-      {"ok", "true"},              {"none", "null"},        {"list", nullptr},
-      {"Code", nullptr},           {"", nullptr},
+      {"none", "null"},            {"list", nullptr},       {"Code", nullptr},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.key);
@@ -62,7 +61,6 @@ TEST(FindMember, NamesWhatIsWrongWithMalformedText) {
     EXPECT_EQ(kojsonz::findMember(c.text, "want", &error), nullptr);
     EXPECT_EQ(error, c.error) << kojsonz::readErrorName(error);
   }
-  EXPECT_STREQ(kojsonz::readErrorName(ReadError::kTrailingChar), "jsonz_errorTrailingChar");
 }
 
 TEST(ReadValues, ConvertByTypeAndRefuseOthers) {
