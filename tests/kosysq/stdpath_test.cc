@@ -1,6 +1,5 @@
 #include "kosysq/stdpath.h"
 
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <map>
@@ -22,18 +21,7 @@ std::map<std::string, std::string> defaultsWith(
   return table;
 }
 
-class StandardDirectoriesTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    void* standIn = dlopen(kosysq::kRelocationLibrary, RTLD_NOW);
-    ASSERT_NE(standIn, nullptr) << "the relocation stand-in must be on LD_LIBRARY_PATH "
-                                   "(run through ctest): "
-                                << dlerror();
-    dlclose(standIn);
-  }
-};
-
-TEST_F(StandardDirectoriesTest, RelocatesThroughTheLibraryUntilAnAnswerFails) {
+TEST(StandardDirectoriesTest, RelocatesThroughTheLibraryUntilAnAnswerFails) {
   struct Case {
     const char* name;
     const char* library;
@@ -70,7 +58,7 @@ TEST_F(StandardDirectoriesTest, RelocatesThroughTheLibraryUntilAnAnswerFails) {
   }
 }
 
-TEST_F(StandardDirectoriesTest, ProcessTableIsBuiltOnceOnFirstUse) {
+TEST(StandardDirectoriesTest, ProcessTableIsBuiltOnceOnFirstUse) {
   ScopedEnv answers("KORELOCATIONS_ANSWERS", std::string("docdir=/opt/k/doc"));
   OwnedStatus status;
   EXPECT_EQ(kosysq::standardDirectories().lookup("docdir", status), "/opt/k/doc");
