@@ -6,18 +6,11 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
-#include <memory>
 #include <string>
 
 #include "error_record/status.h"
 
 namespace koerr_test {
-
-using JsonPtr = std::unique_ptr<cJSON, decltype(&cJSON_Delete)>;
-
-inline JsonPtr parse(const char* text) {
-  return JsonPtr(text != nullptr ? cJSON_Parse(text) : nullptr, &cJSON_Delete);
-}
 
 // The buffer invariant: text, then zeros up to the guard in the last byte.
 inline ::testing::AssertionResult holdsInvariant(const koerr::Status& status) {
@@ -33,11 +26,11 @@ inline ::testing::AssertionResult holdsInvariant(const koerr::Status& status) {
   if (status.json[status.capacity - 1] != koerr::kGuard) {
     return ::testing::AssertionFailure() << "guard missing";
   }
-  JsonPtr root = parse(status.json);
-  if (!root || !cJSON_IsObject(root.get())) {
-    return ::testing::AssertionFailure() << "not a JSON object: " << status.json;
-  }
-  return ::testing::AssertionSuccess();
+  cJSON* root = cJSON_Parse(status.json);
+  const bool object = cJSON_IsObject(root);
+  cJSON_Delete(root);
+  return object ? ::testing::AssertionSuccess()
+                : ::testing::AssertionFailure() << "not a JSON object: " << status.json;
 }
 
 }  // namespace koerr_test
