@@ -219,7 +219,8 @@ TEST(TimescaleHelpers, TrListsAreReadLenientlyButNeverGuessed) {
   EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }),
             helperRecord("koapalerr_invalidParameter", 193,
                          "\"message\":\"Failed to parse TR IDs from TR list JSON.\","
-                         "\"trListJson\":\"{\\\"trs\\\":[\\\"a\\\"]}\",\"trIds\":\"timeReferences\""));
+                         "\"trListJson\":\"{\\\"trs\\\":[\\\"a\\\"]}\","
+                         "\"trIds\":\"timeReferences\""));
   // The JSON layer's own records pass unchanged.
   service.trList = "{\"timeReferences\":\"a\"}";
   EXPECT_EQ(thrownBy([&] { (void)helpers.getTrIds(); }),

@@ -90,8 +90,12 @@ TEST(ErrorsParserTest, FilesOfAnotherKindAreSkippedQuietly) {
 
 TEST(ErrorsParserTest, MalformedFilesAreReportedExactly) {
   ScratchDir dir;
-  const std::string prefix =
-      "{\"error_constant\":\"koapalerr_resourceNotFound\",\"file\":\"koxlator/gxErrorsParser\",";
+  // `debug` ends in the quote of the debug text, plus any members after it.
+  const auto malformed = [](int line, const std::string& debug) {
+    return "{\"error_constant\":\"koapalerr_resourceNotFound\","
+           "\"file\":\"koxlator/gxErrorsParser\",\"line\":" + std::to_string(line) +
+           ",\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":\"" + debug + "}}";
+  };
   struct Case {
     const char* name;
     std::string content;  // empty: the file does not exist
@@ -99,21 +103,16 @@ TEST(ErrorsParserTest, MalformedFilesAreReportedExactly) {
   };
   const Case cases[] = {
       {"missing", "",
-       prefix +
-           "\"line\":148,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
-           "\"Could not open status explanations file\",\"path\":\"" +
-           dir.str() + "/missing\"}}"},
+       malformed(148, "Could not open status explanations file\",\"path\":\"" + dir.str() +
+                          "/missing\"")},
       {"no end tag", kHead + "<koerror code=\"1\">\none\n",
-       prefix +
-           "\"line\":208,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
-           "\"Bad explanation file. Could not find the end of the status code definition !\"}}"},
+       malformed(208, "Bad explanation file. Could not find the end of the status code "
+                      "definition !\"")},
       {"NUL line",
        kHead + entry("2", "two\n") + std::string("\0heading\n", 9) + entry("1", "one\n"),
-       prefix + "\"line\":229,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
-                "\"Bad explanation file. Unidentified section heading !\"}}"},
+       malformed(229, "Bad explanation file. Unidentified section heading !\"")},
       {"unreadable code", kHead + entry("one", "one\n"),
-       prefix + "\"line\":176,\"component\":\"quillon\",\"koxlator_debug\":{\"debug\":"
-                "\"Could not successfully read the status data!\",\"sscanf\":0}}"},
+       malformed(176, "Could not successfully read the status data!\",\"sscanf\":0")},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.name);
