@@ -138,7 +138,7 @@ std::string noTimescale(const std::string& wrong, const std::string& list) {
 }
 std::string noDevice(int line, const std::string& wrong) {
   return notFound(line, "\"message\":\"Requested syncableDeviceUri does not exist on this host.\","
-                        "\"localDeviceUri\":\"" + wrong + "\",\"onlyDeviceUri\":\"" + kDeviceUri + "\"");
+                        "\"localDeviceUri\":" + quoted(wrong) + ",\"onlyDeviceUri\":\"" + kDeviceUri + "\"");
 }
 
 // The record inside an error answer's "errorInfo", "" without one.
@@ -183,8 +183,11 @@ TEST(ServiceOverHttp, ListingTimescalesAndDeviceByteForByte) {
                noTimescale(slave, "[\"" + kMixedUris[0] + "\",\"" + kMixedUris[1] + "\",\"" +
                                       kMixedUris[2] + "\",\"" + kMixedUris[3] + "\"]"),
                "-52006");
-  const std::string wrongDevice = std::string(kDeviceUri) + "X";
-  expectAnswer(host.get(wrongDevice), 500, noDevice(75, wrongDevice), "-52006");
+  // Only the exact URI is the device: not a prefix of it (GET), nor one that
+  // differs in case (PUT) or extends it (the load test, with a quote that the
+  // envelope escapes once more).
+  const std::string prefix = "/quillon/syncableDevices/pendulo/timekeeper/genericT";
+  expectAnswer(host.get(prefix), 500, noDevice(75, prefix), "-52006");
   EXPECT_EQ(host.process().stop(), 0);
 }
 
@@ -204,6 +207,7 @@ TEST(ServiceOverHttp, RefusalsNoTimescalesAndEditsWhileRunning) {
   expectAnswer(host.get("/quillon/resources"), 200, successEnvelope(listing(kDeviceEntry)));
   expectAnswer(host.get("/quillon/resources?resourceType=timescales"), 200,
                successEnvelope("{\"version\":1,\"resources\":]}"));
+  expectAnswer(host.get(kMixedUris[1]), 500, noTimescale(kMixedUris[1], "[]"), "-52006");
 
   host.writeScenario(scenario({kMixed[2]}));
   const std::string expected = successEnvelope(listing(kDeviceEntry + "," + entries({kMixedUris[2]})));
@@ -292,7 +296,7 @@ TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
   const std::string& master = kMixedUris[2];
   const std::string timescales = entries({boundary, master});
   const std::string wrongTs = kTs + "tr2/00-80-2f-ff-fe-65-43-21";
-  const std::string wrongDevice = std::string(kDeviceUri) + "X";
+  const std::string wrongDevice = std::string(kDeviceUri) + "\"";
   struct Expected {
     std::string method;
     std::string target;
@@ -310,7 +314,7 @@ TEST(ServiceUnderLoad, EightClientsOfMixedRequestsGetExactAnswers) {
        {successEnvelope(deviceDocument("null", true)),
         successEnvelope(deviceDocument("{\"maxOffsetNanos\":1000}", true)),
         successEnvelope(deviceDocument("{\"maxOffsetNanos\":100}", false))}},
-      {"PUT", wrongDevice, "{}", 500, {noDevice(127, wrongDevice)}},
+      {"PUT", std::string(kDeviceUri) + "%22", "{}", 500, {noDevice(127, wrongDevice)}},
       {"PUT", kDeviceUri, "{\"maxOffsetNanos\":100}", 200, {successEnvelope("{}")}},
       {"GET", "/quillon/unknownCommand", "", 404, {successEnvelope()}},
   };
