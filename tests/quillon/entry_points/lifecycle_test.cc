@@ -14,59 +14,50 @@
 namespace {
 
 // Answers every resource with "{}"; counts its lifetimes.
-class CountingResourceManager : public quillon::ResourceManagerInterface {
- public:
-  CountingResourceManager(std::shared_ptr<kosdtools::pendulo::TimescaleHelpersInterface> helpers,
-                          int& destroyed)
-      : helpers_(std::move(helpers)), destroyed_(destroyed) {}
-  ~CountingResourceManager() override { ++destroyed_; }
+struct CountingResourceManager : quillon::ResourceManagerInterface {
+  CountingResourceManager(std::shared_ptr<kosdtools::pendulo::TimescaleHelpersInterface> h, int& d)
+      : helpers(std::move(h)), destroyed(d) {}
+  ~CountingResourceManager() override { ++destroyed; }
   std::string getResources(const std::string&) override { return "{}"; }
   std::string getSyncableDevice(const std::string&) override { return "{}"; }
   std::string getTimescale(const std::string&) override { return "{}"; }
   void putSyncableDevice(const std::string&, const std::string&) override {}
-
- private:
-  std::shared_ptr<kosdtools::pendulo::TimescaleHelpersInterface> helpers_;
-  int& destroyed_;
+  std::shared_ptr<kosdtools::pendulo::TimescaleHelpersInterface> helpers;  // keeps the wrapper
+  int& destroyed;
 };
 
 class LifecycleTest : public ::testing::Test {
  protected:
-  quillon::GraphFactories factories() {
-    quillon::GraphFactories graph;
-    graph.wrapper = [this] {
-      ++wrappersMade;
-      return std::make_shared<kopendulo::ApiWrapper>();
-    };
-    graph.helpers = [](std::shared_ptr<kopendulo::ApiWrapperInterface> wrapper) {
-      return std::make_shared<kosdtools::pendulo::TimescaleHelpers>(std::move(wrapper));
-    };
-    graph.resourceManager = [this](auto helpers) {
-      if (failNextGraph) throw std::runtime_error("no graph today");
-      ++managersMade;
-      return std::make_shared<CountingResourceManager>(std::move(helpers), managersDestroyed);
-    };
-    return graph;
-  }
-
   int wrappersMade = 0;
   int managersMade = 0;
   int managersDestroyed = 0;
   bool failNextGraph = false;
-  quillon::PluginLifecycle lifecycle{factories()};
+  quillon::PluginLifecycle lifecycle{quillon::GraphFactories{
+      [this] {
+        ++wrappersMade;
+        return std::make_shared<kopendulo::ApiWrapper>();
+      },
+      [](auto wrapper) { return std::make_shared<kosdtools::pendulo::TimescaleHelpers>(std::move(wrapper)); },
+      [this](auto helpers) {
+        if (failNextGraph) throw std::runtime_error("no graph today");
+        ++managersMade;
+        return std::make_shared<CountingResourceManager>(std::move(helpers), managersDestroyed);
+      }}};
 };
 
-TEST_F(LifecycleTest, SecondInitReplacesTheServiceAndReusesTheWrapper) {
+TEST_F(LifecycleTest, InitReplacesTheServiceAndFinalizeReleasesTheGraphOnce) {
+  lifecycle.finalize();  // before any Init
   lifecycle.init();
   const quillon::Service* first = lifecycle.service();
-  const auto wrapper = lifecycle.wrapper();
+  auto wrapper = lifecycle.wrapper();
   ASSERT_NE(first, nullptr);
   ASSERT_NE(wrapper, nullptr);
 
+  // A second Init replaces the service and reuses the wrapper.
   lifecycle.init();
   EXPECT_NE(lifecycle.service(), first);
   EXPECT_EQ(lifecycle.wrapper(), wrapper);
-  EXPECT_EQ(wrappersMade, 1);
+  wrapper.reset();
   EXPECT_EQ(managersMade, 2);
   EXPECT_EQ(managersDestroyed, 1);
 
@@ -76,20 +67,13 @@ TEST_F(LifecycleTest, SecondInitReplacesTheServiceAndReusesTheWrapper) {
   lifecycle.init();
   EXPECT_EQ(lifecycle.service(), current);
   EXPECT_EQ(managersDestroyed, 1);
-}
+  failNextGraph = false;
 
-TEST_F(LifecycleTest, FinalizeReleasesTheGraphOnceAndANewInitMakesANewWrapper) {
-  lifecycle.finalize();  // before any Init
-  EXPECT_EQ(lifecycle.service(), nullptr);
-
-  lifecycle.init();
+  lifecycle.finalize();
   lifecycle.finalize();
   EXPECT_EQ(lifecycle.service(), nullptr);
+  EXPECT_EQ(managersDestroyed, 2);
   EXPECT_EQ(lifecycle.wrapper(), nullptr);  // expired with its graph
-  EXPECT_EQ(managersDestroyed, 1);
-  lifecycle.finalize();
-  EXPECT_EQ(managersDestroyed, 1);
-
   lifecycle.init();
   EXPECT_EQ(wrappersMade, 2);
   EXPECT_NE(lifecycle.wrapper(), nullptr);
