@@ -5,7 +5,6 @@
 
 #include <cstring>
 #include <functional>
-#include <stdexcept>
 #include <string>
 
 #include "error_record/exception.h"
@@ -127,6 +126,8 @@ TEST_F(RequestTest, MediaTypesReportHostFailures) {
   }
 }
 
+// Bodies without a NUL, as the host passes them, and the empty body are read
+// over HTTP by a sanitized host.
 TEST_F(RequestTest, BodyIsReadWithinTheReportedSizeUpToItsFirstNul) {
   auto probe = [&](int32_t code, uint32_t size) {
     EXPECT_CALL(mock, readPostData(nullptr, _))
@@ -147,10 +148,6 @@ TEST_F(RequestTest, BodyIsReadWithinTheReportedSizeUpToItsFirstNul) {
   probe(codes::k_POSTDATAAVAILABLE, 9);
   copy(std::string("{\"a\":1}\0x", 9), 0);
   EXPECT_EQ(request.readPostData(), "{\"a\":1}");
-  // No NUL inside the size: the text stops at the size (ASan checks the bound).
-  probe(codes::k_POSTDATAAVAILABLE, 3);
-  copy("abc", 0);
-  EXPECT_EQ(request.readPostData(), "abc");
 
   probe(codes::k_UNKNOWNREQUEST, 0);
   EXPECT_EQ(recordOf([&] { request.readPostData(); }),
@@ -160,14 +157,6 @@ TEST_F(RequestTest, BodyIsReadWithinTheReportedSizeUpToItsFirstNul) {
   EXPECT_EQ(recordOf([&] { request.readPostData(); }),
             hostFailure(codes::k_BUFFERTOOSMALL, 86,
                         "ReadPostData_C_REST_KO_GXWS_(_requestID, *inputptrHandle, length)"));
-
-  probe(0, 0);
-  try {
-    request.readPostData();
-    ADD_FAILURE() << "an empty body must throw";
-  } catch (const std::logic_error& error) {
-    EXPECT_STREQ(error.what(), "basic_string::_S_construct null not valid");
-  }
 }
 
 // What succeeds is seen by every client over HTTP; a failed flush is not.
