@@ -83,12 +83,10 @@ TEST(HostEndToEnd, SendsTheLastCodeAndOutOfRangeCodesAs500WithTheCodeInAHeader) 
     const char* contentType;   // null: header absent
     const char* body;
   } cases[] = {
-      {"/echo/status?code=201&mime=a%2Fb", 201, nullptr, "a/b", "status\n"},
-      {"/echo/status?code=599", 599, nullptr, nullptr, "status\n"},
+      {"/echo/status?code=599&mime=a%2Fb", 599, nullptr, "a/b", "status\n"},
       {"/echo/status?code=-52006&mime=vnd.x%2Fjson", 500, "-52006", "vnd.x/json", "status\n"},
       {"/echo/status?code=600", 500, "600", nullptr, "status\n"},
       {"/echo/status", 200, nullptr, nullptr, "status\n"},
-      {"/echo/unknown", 404, nullptr, nullptr, ""},
   };
   HttpClient client(host.port());
   for (const Case& c : cases) {
