@@ -237,7 +237,8 @@ TEST(ServiceOverHttp, PutThenGetAndBadBodies) {
   expectAnswer(bad, 500, errorEnvelope(-52005, shippedExplanation(-52005), record), "-52005");
   EXPECT_EQ(record.rfind("{\"error_constant\":\"koapalerr_invalidParameter\",", 0), 0u) << record;
   EXPECT_NE(record.find(",\"kosdlib_debug\":{"), std::string::npos) << record;
-  // An empty body fails the host read once the envelope is out: the record follows it.
+  // An empty body fails outside the resource's own errors: the envelope still
+  // goes out, and the raw record follows it.
   expectAnswer(host.put(kDeviceUri, "", vendor), 500,
                successEnvelope() + "{\"error_constant\":\"quillon::kInternalSoftwareError\",\"file\":"
                                    "\"quillon/errors\",\"line\":50,\"component\":\"quillon\",\"quillon_debug\":"

@@ -4,7 +4,6 @@
 #include <gtest/gtest.h>
 
 #include <functional>
-#include <stdexcept>
 
 #include "support/answer_fixtures.h"
 #include "error_record/constants.h"
@@ -145,23 +144,6 @@ TEST_F(ServiceTest, MapsCommandsOntoResourceOperations) {
     EXPECT_EQ(status.code, 0);
     ::testing::Mock::VerifyAndClearExpectations(manager_.get());
   }
-}
-
-// A host read that fails answers 500 with the raw record; that is checked over
-// HTTP. A non-record exception from the resource is not an error of the
-// resource: the envelope still goes out, then the caller's record behind it.
-TEST_F(ServiceTest, ForeignFailuresAnswer500WithTheRawRecordAfterTheEnvelope) {
-  EXPECT_CALL(*manager_, getResources(_)).WillOnce(Throw(std::runtime_error("boom")));
-  OwnedStatus foreign;
-  const Answer seen = answer({0, "resources", "", "", ""}, foreign);
-  EXPECT_EQ(seen.calls,
-            (std::vector<std::string>{"code 200", "method", "contentType", "accept", "command",
-                                      "output", "mime", "output", "code 500"}));
-  EXPECT_EQ(seen.body, successEnvelope() +
-                           "{\"error_constant\":\"quillon::kInternalSoftwareError\",\"file\":"
-                           "\"quillon/errors\",\"line\":50,\"component\":\"quillon\","
-                           "\"quillon_debug\":{\"std::exception\":\"boom\"}}");
-  EXPECT_EQ(seen.mimeTypes, std::vector<std::string>{kMedia});
 }
 
 TEST_F(ServiceTest, RefusesWithoutTouchingAnythingWhenItCannotStart) {
