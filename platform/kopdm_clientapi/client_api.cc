@@ -1,18 +1,36 @@
-// The exported C functions: each forwards to the one simulated service of the
-// process, created on first use from KOPDM_SIM_SCENARIO.
+// The exported C functions: each forwards to the one service of the process,
+// created on first use: the live service over ptp4l daemons when
+// KOPDM_PTP4L_CONFIG names its configuration, else the simulated one serving
+// KOPDM_SIM_SCENARIO (or the built-in scenario).
 #include <cstdlib>
+#include <memory>
+#include <string>
 
+#include "backend.h"
 #include "kopdm_clientapi.h"
+#include "live/live_time_service.h"
+#include "ptp_management/uds_client.h"
 #include "time_service.h"
 
 namespace {
 
-kopdmsim::TimeService& service() {
-  static kopdmsim::TimeService instance([] {
-    const char* path = std::getenv("KOPDM_SIM_SCENARIO");
-    return std::string(path != nullptr ? path : "");
-  }());
-  return instance;
+std::string environment(const char* name) {
+  const char* value = std::getenv(name);
+  return value != nullptr ? value : "";
+}
+
+std::unique_ptr<kopdmsim::Backend> makeService() {
+  const std::string live = environment("KOPDM_PTP4L_CONFIG");
+  if (!live.empty()) {
+    return std::make_unique<kopdmlive::LiveTimeService>(live,
+                                                        ptpmgmt::UdsClient::defaultDirectory());
+  }
+  return std::make_unique<kopdmsim::TimeService>(environment("KOPDM_SIM_SCENARIO"));
+}
+
+kopdmsim::Backend& service() {
+  static const std::unique_ptr<kopdmsim::Backend> instance = makeService();
+  return *instance;
 }
 
 }  // namespace

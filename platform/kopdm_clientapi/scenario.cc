@@ -200,23 +200,6 @@ void readScenario(const cJSON* root, Scenario& scenario) {
   readFaults(root, scenario);
 }
 
-std::string syntaxProblem(const std::string& text, const char* end) {
-  std::size_t offset = end != nullptr ? static_cast<std::size_t>(end - text.c_str()) : 0;
-  if (offset > text.size()) offset = text.size();
-  std::size_t line = 1;
-  std::size_t column = 1;
-  for (std::size_t i = 0; i < offset; ++i) {
-    if (text[i] == '\n') {
-      ++line;
-      column = 1;
-    } else {
-      ++column;
-    }
-  }
-  return "the text is not valid JSON (syntax error at line " + std::to_string(line) + ", column " +
-         std::to_string(column) + ")";
-}
-
 }  // namespace
 
 const char* callName(Call call) { return kCallNames[static_cast<std::size_t>(call)]; }
@@ -249,16 +232,6 @@ bool parseScenario(const std::string& text, Scenario* out, std::string* problem)
     *problem = error.problem;
     return false;
   }
-}
-
-std::string renderMember(std::string_view key, std::string_view valueJson) {
-  std::string member = "{\"";
-  member.reserve(key.size() + valueJson.size() + 6);
-  koerr::appendJsonEscaped(member, key);
-  member += "\":";
-  member += valueJson;
-  member += '}';
-  return member;
 }
 
 std::string valueFromText(const char* text) {

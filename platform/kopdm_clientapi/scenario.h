@@ -14,6 +14,8 @@
 #include <string_view>
 #include <vector>
 
+#include "answer_text.h"
+
 namespace kopdmsim {
 
 // The library calls, by the names that fault entries use.
@@ -65,8 +67,6 @@ struct Scenario {
 // where, for a syntax error), when it is not a usable scenario.
 bool parseScenario(const std::string& text, Scenario* out, std::string* problem);
 
-// {"<key>":<valueJson>}, the key escaped.
-std::string renderMember(std::string_view key, std::string_view valueJson);
 // The compact JSON of a value given as text: itself when it is JSON, else the
 // text as a JSON string.
 std::string valueFromText(const char* text);

@@ -8,6 +8,7 @@
 #include <mutex>
 
 #include "default_scenario.h"
+#include "answer_text.h"
 #include "error_record/error.h"
 #include "service_codes.h"
 
@@ -16,37 +17,6 @@ namespace {
 
 constexpr const char* kFile = "kopdm_clientapi/timeService";
 constexpr const char* kChannel = "kopdmclientapi_debug";
-// A scenario is a hand-written file; anything larger is a mistake.
-constexpr long kMaxScenarioBytes = 16L * 1024 * 1024;
-
-bool readFile(const std::string& path, std::string* text, std::string* problem) {
-  FILE* file = std::fopen(path.c_str(), "rb");
-  if (file == nullptr) {
-    *problem = std::string("the file cannot be opened: ") + std::strerror(errno);
-    return false;
-  }
-  char chunk[8192];
-  size_t count;
-  while ((count = std::fread(chunk, 1, sizeof chunk, file)) > 0) {
-    text->append(chunk, count);
-    if (static_cast<long>(text->size()) > kMaxScenarioBytes) {
-      std::fclose(file);
-      *problem = "the file is larger than 16 MiB";
-      return false;
-    }
-  }
-  const bool failed = std::ferror(file) != 0;
-  std::fclose(file);
-  if (failed) *problem = "the file cannot be read";
-  return !failed;
-}
-
-void copyAnswer(const std::string& answer, char* buffer, uint32_t capacity) {
-  const size_t length = answer.size() < capacity ? answer.size() : capacity - 1;
-  std::memcpy(buffer, answer.data(), length);
-  buffer[length] = '\0';
-}
-
 // Publication numbers are drawn from one counter, so that a number never
 // names the snapshots of two services, even one destroyed and another built
 // at the same address.
@@ -103,7 +73,7 @@ TimeService::State TimeService::loadState() const {
     text = defaultScenarioText();
   } else {
     state.stamp = stampOf(path_);
-    if (!readFile(path_, &text, &state.problem)) return state;
+    if (!readTextFile(path_, &text, &state.problem)) return state;
   }
   state.usable = parseScenario(text, &state.live, &state.problem);
   state.saved = state.live.trs;

@@ -22,38 +22,39 @@
 #include <string>
 #include <string_view>
 
+#include "backend.h"
 #include "error_record/status.h"
 #include "scenario.h"
 #include "scenario_watch.h"
 
 namespace kopdmsim {
 
-class TimeService {
+class TimeService : public Backend {
  public:
   // An empty `path` serves the built-in default scenario.
   explicit TimeService(std::string path);
-  ~TimeService();
+  ~TimeService() override;
   TimeService(const TimeService&) = delete;
   TimeService& operator=(const TimeService&) = delete;
 
-  // The results follow the client library's header: 0 (1 for a selected TR)
-  // on success, otherwise the code reported in `status`.
-  int32_t getApiVersion();
-  int32_t getSelectedTrId(char* buffer, uint32_t capacity, koerr::Status* status);
-  int32_t getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Status* status);
-  int32_t getPdmAttrJson(const char* key, char* buffer, uint32_t capacity, koerr::Status* status);
-  int32_t getPdmMetadataJson(char* buffer, uint32_t capacity, koerr::Status* status);
+  int32_t getApiVersion() override;
+  int32_t getSelectedTrId(char* buffer, uint32_t capacity, koerr::Status* status) override;
+  int32_t getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Status* status) override;
+  int32_t getPdmAttrJson(const char* key, char* buffer, uint32_t capacity,
+                         koerr::Status* status) override;
+  int32_t getPdmMetadataJson(char* buffer, uint32_t capacity, koerr::Status* status) override;
   int32_t getTrAttrJson(const char* trId, const char* key, char* buffer, uint32_t capacity,
-                        koerr::Status* status);
+                        koerr::Status* status) override;
   int32_t getTrMetadataJson(const char* trId, char* buffer, uint32_t capacity,
-                            koerr::Status* status);
-  int32_t setTrAttr(const char* trId, const char* key, const char* value, koerr::Status* status);
-  int32_t restartService(koerr::Status* status);
-  int32_t bringDownService(koerr::Status* status);
-  int32_t bringUpService(koerr::Status* status);
-  int32_t persistConfig(koerr::Status* status);
-  int32_t updateTrFromConfig(const char* trId, koerr::Status* status);
-  int32_t adjustTime(int64_t seconds, int64_t nanoseconds, koerr::Status* status);
+                            koerr::Status* status) override;
+  int32_t setTrAttr(const char* trId, const char* key, const char* value,
+                    koerr::Status* status) override;
+  int32_t restartService(koerr::Status* status) override;
+  int32_t bringDownService(koerr::Status* status) override;
+  int32_t bringUpService(koerr::Status* status) override;
+  int32_t persistConfig(koerr::Status* status) override;
+  int32_t updateTrFromConfig(const char* trId, koerr::Status* status) override;
+  int32_t adjustTime(int64_t seconds, int64_t nanoseconds, koerr::Status* status) override;
 
  private:
   struct FileStamp {

@@ -18,7 +18,7 @@ namespace {
 constexpr const char* kFile = "kosdlib/SyncableDevice";
 constexpr const char* kChannel = "kosdlib_debug";
 // The simulated clock keeps this distance from its timescale.
-constexpr int32_t kSimulatedOffsetNanos = 250;
+constexpr int64_t kSimulatedOffsetNanos = 250;
 
 void reportInvalid(kosdlib_Status* status, int32_t line, const char* message) {
   koerr::Report(*status, koerr::koapalerr_invalidParameter, kFile, line)
@@ -40,8 +40,20 @@ int64_t requiredMaxOffset(const std::string& requirements) {
   return value;
 }
 
-bool withinBound(int64_t bound) {
-  return bound <= 0 || kSimulatedOffsetNanos <= bound;
+// The device's distance from its timescale, when it is known.
+struct Offset {
+  bool known;
+  int64_t nanos;
+};
+
+// A bound of 0 or less sets no limit; an offset nobody knows meets none.
+bool withinBound(const Offset& offset, int64_t bound) {
+  if (!offset.known) return false;
+  if (bound <= 0) return true;
+  // The magnitude as unsigned, so that the most negative offset has one too.
+  const uint64_t magnitude = offset.nanos < 0 ? 0 - static_cast<uint64_t>(offset.nanos)
+                                              : static_cast<uint64_t>(offset.nanos);
+  return magnitude <= static_cast<uint64_t>(bound);
 }
 
 }  // namespace
@@ -51,7 +63,27 @@ struct kosdlib_SyncableDevice {
   std::string kind;
   std::mutex mutex;
   std::string requirements;  // minified JSON object, "" when none
+  kosdlib_OffsetSource offsetSource = nullptr;  // null: the simulated clock
+  void* offsetContext = nullptr;
 };
+
+namespace {
+
+// Asked outside the device's mutex: a source may take its time to answer.
+Offset currentOffset(kosdlib_SyncableDeviceHandle device) {
+  kosdlib_OffsetSource source;
+  void* context;
+  {
+    std::lock_guard<std::mutex> lock(device->mutex);
+    source = device->offsetSource;
+    context = device->offsetContext;
+  }
+  if (source == nullptr) return {true, kSimulatedOffsetNanos};
+  int64_t nanos = 0;
+  return source(context, &nanos) == 1 ? Offset{true, nanos} : Offset{false, 0};
+}
+
+}  // namespace
 
 kosdlib_SyncableDeviceHandle kosdlib_SyncableDevice_create(const char* uri, const char* kind,
                                                            kosdlib_Status* status) {
@@ -133,9 +165,20 @@ int32_t kosdlib_SyncableDevice_isCoherent(kosdlib_SyncableDeviceHandle device,
     reportInvalid(status, __LINE__, "The device handle is null.");
     return -1;
   }
-  if (maxOffsetNanos > 0) return withinBound(maxOffsetNanos) ? 1 : 0;
+  const Offset offset = currentOffset(device);
+  if (maxOffsetNanos > 0) return withinBound(offset, maxOffsetNanos) ? 1 : 0;
   std::lock_guard<std::mutex> lock(device->mutex);
-  return withinBound(requiredMaxOffset(device->requirements)) ? 1 : 0;
+  return withinBound(offset, requiredMaxOffset(device->requirements)) ? 1 : 0;
+}
+
+void kosdlib_SyncableDevice_setOffsetSource(kosdlib_SyncableDeviceHandle device,
+                                            kosdlib_OffsetSource source, void* context,
+                                            kosdlib_Status* status) {
+  if (status == nullptr) return;
+  if (device == nullptr) return reportInvalid(status, __LINE__, "The device handle is null.");
+  std::lock_guard<std::mutex> lock(device->mutex);
+  device->offsetSource = source;
+  device->offsetContext = context;
 }
 
 const char* kosdlib_SyncableDevice_getUri(kosdlib_SyncableDeviceHandle device,
@@ -154,6 +197,7 @@ char* kosdlib_SyncableDevice_toJson(kosdlib_SyncableDeviceHandle device, kosdlib
     reportInvalid(status, __LINE__, "The device handle is null.");
     return nullptr;
   }
+  const Offset offset = currentOffset(device);
   try {
     std::string text;
     text.reserve(160 + device->uri.size());
@@ -164,14 +208,14 @@ char* kosdlib_SyncableDevice_toJson(kosdlib_SyncableDeviceHandle device, kosdlib
     {
       std::lock_guard<std::mutex> lock(device->mutex);
       text += device->requirements.empty() ? "null" : device->requirements;
-      coherent = withinBound(requiredMaxOffset(device->requirements));
+      coherent = withinBound(offset, requiredMaxOffset(device->requirements));
     }
     text += ",\"plugin\":\"";
     koerr::appendJsonEscaped(text, device->kind);
     text += "\",\"coherent\":";
     text += coherent ? "true" : "false";
     text += ",\"offsetNanos\":";
-    text += std::to_string(kSimulatedOffsetNanos);
+    text += offset.known ? std::to_string(offset.nanos) : "null";
     text += '}';
     char* out = static_cast<char*>(std::malloc(text.size() + 1));
     if (out == nullptr) throw std::bad_alloc();

@@ -59,20 +59,39 @@ KOSDLIB_EXPORT void kosdlib_SyncableDevice_clearCoherencyRequirements(
 /* 1 when the device's clock is within `maxOffsetNanos` of its timescale, 0
  * otherwise. A bound of 0 or less means "the stored requirements": their
  * member "maxOffsetNanos" when they have one, otherwise the device counts as
- * coherent. -1 with -52005 for a null handle. */
+ * coherent. A device whose offset is not known is never coherent. -1 with
+ * -52005 for a null handle. */
 KOSDLIB_EXPORT int32_t kosdlib_SyncableDevice_isCoherent(
     kosdlib_SyncableDeviceHandle device, int32_t maxOffsetNanos, kosdlib_Status* status);
+
+/* Where a device learns its distance from its timescale: writes the offset
+ * in nanoseconds to `*offsetNanos` and returns 1, or returns 0 when it cannot
+ * tell. It is called on the thread of the call that needs it, without any
+ * lock of the device held. */
+typedef int (*kosdlib_OffsetSource)(void* context, int64_t* offsetNanos);
+
+/* Makes `source` (with `context`) the device's offset; null restores the
+ * simulated clock, which stays 250 ns away. Device plug-ins call this right
+ * after creation. -52005 for a null handle. */
+KOSDLIB_EXPORT void kosdlib_SyncableDevice_setOffsetSource(
+    kosdlib_SyncableDeviceHandle device, kosdlib_OffsetSource source, void* context,
+    kosdlib_Status* status);
 
 /* The device's URI, owned by the handle and valid until it is deleted. */
 KOSDLIB_EXPORT const char* kosdlib_SyncableDevice_getUri(
     kosdlib_SyncableDeviceHandle device, kosdlib_Status* status);
 
-/* The device document, allocated with malloc; the caller frees it with free.
- * Null with -52000 when memory runs out. */
+/* The device document, allocated with malloc; the caller frees it with free:
+ * {"uri":...,"coherencyRequirements":...,"plugin":...,"coherent":...,"offsetNanos":...}
+ * with "offsetNanos" null (and "coherent" false) when the offset is not
+ * known. Null with -52000 when memory runs out. */
 KOSDLIB_EXPORT char* kosdlib_SyncableDevice_toJson(
     kosdlib_SyncableDeviceHandle device, kosdlib_Status* status);
 
-/* libkopenduloSdPlugin: the time keeper driven by the local time service. */
+/* libkopenduloSdPlugin: the time keeper driven by the local time service.
+ * When the time service serves live ptp4l state (KOPDM_PTP4L_CONFIG set and
+ * not empty), its offset is the selected time reference's; otherwise it is
+ * the simulated clock's. */
 KOSDLIB_EXPORT kosdlib_SyncableDeviceHandle kosdplugins_pendulo_SyncableDeviceActual_create(
     const char* uri, kosdlib_Status* status);
 

@@ -1,0 +1,245 @@
+#include "live/daemon_link.h"
+
+#include <unistd.h>
+
+#include <cerrno>
+#include <vector>
+
+namespace kopdmlive {
+namespace {
+
+using ptpmgmt::DecodeError;
+using ptpmgmt::ExchangeOutcome;
+using ptpmgmt::ManagementId;
+using ptpmgmt::PendingGet;
+
+// Calls `visit` with every data set of a state, in the order they are asked.
+template <typename Visit>
+void forEachDataSet(DaemonState& state, Visit&& visit) {
+  visit(state.defaults);
+  visit(state.current);
+  visit(state.parent);
+  visit(state.timeProperties);
+  visit(state.port);
+  visit(state.timeStatus);
+  visit(state.portProperties);
+}
+
+bool isPortScope(ManagementId id) {
+  return id == ManagementId::kPortDataSet || id == ManagementId::kPortPropertiesNp;
+}
+
+// The client's identity: pmc's convention of a zero clock and the pid as
+// port, which no daemon uses for itself.
+ptpmgmt::PortIdentity clientIdentity() {
+  ptpmgmt::PortIdentity identity;
+  identity.port = static_cast<uint16_t>(::getpid());
+  return identity;
+}
+
+template <typename DataSet>
+void fillFromAnswer(Fetched<DataSet>& out, const PendingGet& get, const ExchangeOutcome& outcome,
+                    bool probed) {
+  out.failure = Failure();
+  out.failure.managementId = static_cast<uint16_t>(DataSet::kId);
+  out.failure.probedTransports = probed;
+  out.failure.transportSpecific = get.request.transportSpecific;
+  if (!get.answered) {
+    out.failure.kind = outcome.unmatchedMalformed != DecodeError::kNone ? FailureKind::kMalformed
+                                                                        : FailureKind::kTimedOut;
+    out.failure.decodeError = outcome.unmatchedMalformed;
+    return;
+  }
+  if (get.malformed != DecodeError::kNone) {
+    out.failure.kind = FailureKind::kMalformed;
+    out.failure.decodeError = get.malformed;
+    return;
+  }
+  if (get.answer.isErrorStatus) {
+    out.failure.kind = FailureKind::kManagementError;
+    out.failure.managementErrorId = get.answer.managementErrorId;
+    return;
+  }
+  out.failure.decodeError = ptpmgmt::decodeDataSet(get.answer, &out.value);
+  if (out.failure.decodeError != DecodeError::kNone) {
+    out.failure.kind = FailureKind::kMalformed;
+    return;
+  }
+  out.ok = true;
+}
+
+// Every data set failed the same way.
+void failAll(DaemonState& state, FailureKind kind, const ptpmgmt::SystemFailure& system,
+             DecodeError decodeError, bool probed) {
+  const uint8_t transportSpecific = state.transportSpecific;
+  forEachDataSet(state, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    fetched.ok = false;
+    fetched.failure = Failure();
+    fetched.failure.kind = kind;
+    fetched.failure.managementId = static_cast<uint16_t>(DataSet::kId);
+    fetched.failure.system = system;
+    fetched.failure.decodeError = decodeError;
+    fetched.failure.probedTransports = probed;
+    fetched.failure.transportSpecific = transportSpecific;
+  });
+}
+
+// A failed send: a daemon that cannot take the request in is as good as one
+// that does not answer.
+void failSend(DaemonState& state, const ptpmgmt::SystemFailure& system, bool probed) {
+  const bool queueFull = system.error == EAGAIN || system.error == EWOULDBLOCK;
+  failAll(state, queueFull ? FailureKind::kTimedOut : FailureKind::kUnreachable, system,
+          DecodeError::kNone, probed);
+  // Asked again by the next call: a daemon that comes back is used at once.
+  state.reusable = queueFull;
+}
+
+// The exchange gave up without a single answer.
+void failSilent(DaemonState& state, const ExchangeOutcome& outcome, bool probed) {
+  const bool malformed = outcome.unmatchedMalformed != DecodeError::kNone;
+  failAll(state, malformed ? FailureKind::kMalformed : FailureKind::kTimedOut, {},
+          outcome.unmatchedMalformed, probed);
+}
+
+bool anyAnswered(const std::vector<PendingGet>& gets) {
+  for (const PendingGet& get : gets) {
+    if (get.answered) return true;
+  }
+  return false;
+}
+
+}  // namespace
+
+DaemonLink::DaemonLink(TrConfig tr, std::chrono::milliseconds timeout,
+                       std::chrono::milliseconds maxAge, std::string clientDirectory)
+    : tr_(std::move(tr)),
+      timeout_(timeout),
+      maxAge_(maxAge),
+      clientDirectory_(std::move(clientDirectory)),
+      self_(clientIdentity()) {}
+
+std::shared_ptr<const DaemonState> DaemonLink::load() const {
+  std::lock_guard<std::mutex> lock(stateMutex_);
+  return state_;
+}
+
+void DaemonLink::store(std::shared_ptr<const DaemonState> state) {
+  std::lock_guard<std::mutex> lock(stateMutex_);
+  state_ = std::move(state);
+}
+
+bool DaemonLink::fresh(const DaemonState& state, Clock::time_point now) const {
+  return state.reusable && now - state.takenAt < maxAge_;
+}
+
+std::shared_ptr<const DaemonState> DaemonLink::state() {
+  std::shared_ptr<const DaemonState> seen = load();
+  const Clock::time_point now = Clock::now();
+  if (seen && fresh(*seen, now)) return seen;
+  std::unique_lock<std::mutex> exchange(exchangeMutex_, std::try_to_lock);
+  if (!exchange.owns_lock()) {
+    // Another thread is asking the daemon right now.
+    if (seen && now - seen->takenAt < kServeLimit) return seen;
+    exchange.lock();
+    std::shared_ptr<const DaemonState> answered = load();
+    // What the other thread learnt, rather than a second wait.
+    if (answered != seen) return answered;
+  } else if (std::shared_ptr<const DaemonState> latest = load();
+             latest != seen && latest && fresh(*latest, Clock::now())) {
+    return latest;
+  }
+  std::shared_ptr<const DaemonState> asked = ask();
+  store(asked);
+  return asked;
+}
+
+PendingGet DaemonLink::pendingGet(ManagementId id, uint8_t transportSpecific) const {
+  PendingGet get;
+  get.request.transportSpecific = transportSpecific;
+  get.request.domainNumber = tr_.domainNumber;
+  get.request.source = self_;
+  get.request.target = ptpmgmt::wildcardPort();
+  if (isPortScope(id)) get.request.target.port = tr_.port;
+  get.request.id = id;
+  return get;
+}
+
+std::shared_ptr<const DaemonState> DaemonLink::ask() {
+  auto state = std::make_shared<DaemonState>();
+  state->takenAt = Clock::now();
+  const Clock::time_point deadline = state->takenAt + timeout_;
+  if (!ensureClient(*state)) return state;
+  const bool probe = transportSpecific_ < 0;
+  if (probe && !probeTransport(*state, deadline)) {
+    state->takenAt = Clock::now();
+    return state;
+  }
+  askRest(*state, deadline, probe);
+  return state;
+}
+
+bool DaemonLink::ensureClient(DaemonState& state) {
+  if (client_) return true;
+  ptpmgmt::SystemFailure failure;
+  client_ = ptpmgmt::UdsClient::open(clientDirectory_, &failure);
+  if (client_) return true;
+  failAll(state, FailureKind::kUnreachable, failure, DecodeError::kNone, false);
+  state.reusable = false;
+  return false;
+}
+
+// A daemon configured for IEEE 802.1AS answers only requests that carry its
+// transportSpecific, so the first exchange asks both ways at once.
+bool DaemonLink::probeTransport(DaemonState& state, Clock::time_point deadline) {
+  std::vector<PendingGet> gets{pendingGet(ManagementId::kDefaultDataSet, 0),
+                               pendingGet(ManagementId::kDefaultDataSet, 1)};
+  const ExchangeOutcome outcome =
+      ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kAnyAnswer, deadline);
+  if (outcome.failure.call != nullptr) {
+    failSend(state, outcome.failure, true);
+    return false;
+  }
+  const PendingGet& answered = gets[0].answered ? gets[0] : gets[1];
+  if (!answered.answered) {
+    failSilent(state, outcome, true);
+    return false;
+  }
+  transportSpecific_ = answered.request.transportSpecific;
+  fillFromAnswer(state.defaults, answered, outcome, true);
+  return true;
+}
+
+void DaemonLink::askRest(DaemonState& state, Clock::time_point deadline, bool haveDefaults) {
+  const uint8_t transportSpecific = static_cast<uint8_t>(transportSpecific_);
+  state.transportSpecific = transportSpecific;
+  std::vector<PendingGet> gets;
+  forEachDataSet(state, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    // The probe already brought the default data set.
+    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
+    gets.push_back(pendingGet(DataSet::kId, transportSpecific));
+  });
+  const ExchangeOutcome outcome =
+      ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kEveryAnswer, deadline);
+  if (outcome.failure.call != nullptr) {
+    failSend(state, outcome.failure, false);
+    return;
+  }
+  if (!anyAnswered(gets) && !haveDefaults) {
+    // Silence from a daemon that answered before: it may have come back
+    // with another transportSpecific, so the next exchange probes again.
+    transportSpecific_ = -1;
+    failSilent(state, outcome, false);
+    state.takenAt = Clock::now();
+    return;
+  }
+  size_t next = 0;
+  forEachDataSet(state, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
+    fillFromAnswer(fetched, gets[next++], outcome, false);
+  });
+}
+
+}  // namespace kopdmlive
