@@ -22,7 +22,6 @@ constexpr const char* kNamePrefix = "kopdm.";
 constexpr size_t kDatagramCapacity = 1024;
 
 std::atomic<uint32_t> nextClientNumber{0};
-std::atomic<bool> staleSwept{false};
 
 bool fillAddress(const std::string& path, sockaddr_un* address, socklen_t* length) {
   std::memset(address, 0, sizeof *address);
@@ -44,9 +43,9 @@ pid_t ownerOf(const char* name) {
 }
 
 // Client paths of processes that died without removing them. A process that
-// runs under another user (EPERM) still runs, so its paths stay.
+// runs under another user (EPERM) still runs, so its paths stay. Clients
+// open rarely (once per daemon and configuration), so each open sweeps.
 void sweepStalePaths(const std::string& directory) {
-  if (staleSwept.exchange(true)) return;
   DIR* dir = ::opendir(directory.c_str());
   if (dir == nullptr) return;
   while (const dirent* entry = ::readdir(dir)) {

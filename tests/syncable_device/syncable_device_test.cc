@@ -3,11 +3,14 @@
 #include <cJSON.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
+#include <cstdlib>
 #include <functional>
 #include <string>
 
 #include "error_record/exception.h"
 #include "support/raised.h"
+#include "kosdlib/kosdlib.h"
 #include "syncable_device/syncable_device_actual.h"
 
 namespace {
@@ -67,6 +70,59 @@ TEST(SyncableDevice, BadRequirementsAndUrisFailWithTheLibraryRecord) {
   }
   EXPECT_EQ(failure([] { SyncableDeviceActual unnamed(""); }),
             "-52005 koapalerr_invalidParameter: The device URI is missing or empty.");
+}
+
+// What a live time service tells the time keeper: an offset, or nothing.
+struct SourceAnswer {
+  bool known;
+  int64_t nanos;
+};
+
+int answer(void* context, int64_t* offsetNanos) {
+  const auto* source = static_cast<const SourceAnswer*>(context);
+  *offsetNanos = source->nanos;
+  return source->known ? 1 : 0;
+}
+
+TEST(SyncableDevice, AnOffsetSourceDecidesOffsetAndCoherence) {
+  koerr::Status status;
+  kosdlib_SyncableDeviceHandle device = kosdlib_SyncableDevice_create(kUri, "pendulo", &status);
+  ASSERT_NE(device, nullptr);
+  kosdlib_SyncableDevice_setCoherencyRequirements(device, "{\"maxOffsetNanos\":1000}", "",
+                                                  &status);
+  const struct {
+    SourceAnswer source;
+    const char* tail;  // the document after the requirements
+    int32_t coherentWithin10;
+  } cases[] = {
+      {{true, -1000}, "\"coherent\":true,\"offsetNanos\":-1000}", 0},
+      {{true, 1001}, "\"coherent\":false,\"offsetNanos\":1001}", 0},
+      {{true, -7}, "\"coherent\":true,\"offsetNanos\":-7}", 1},
+      {{true, INT64_MIN}, "\"coherent\":false,\"offsetNanos\":-9223372036854775808}", 0},
+      {{false, 0}, "\"coherent\":false,\"offsetNanos\":null}", 0},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.tail);
+    SourceAnswer source = c.source;
+    kosdlib_SyncableDevice_setOffsetSource(device, answer, &source, &status);
+    char* text = kosdlib_SyncableDevice_toJson(device, &status);
+    ASSERT_NE(text, nullptr);
+    EXPECT_EQ(std::string(text), std::string("{\"uri\":\"") + kUri +
+                                     "\",\"coherencyRequirements\":{\"maxOffsetNanos\":1000},"
+                                     "\"plugin\":\"pendulo\"," + c.tail);
+    std::free(text);
+    EXPECT_EQ(kosdlib_SyncableDevice_isCoherent(device, 10, &status), c.coherentWithin10);
+    // Without a stored bound any known offset is coherent, an unknown one not.
+    kosdlib_SyncableDevice_clearCoherencyRequirements(device, "", &status);
+    EXPECT_EQ(kosdlib_SyncableDevice_isCoherent(device, 0, &status), c.source.known ? 1 : 0);
+    kosdlib_SyncableDevice_setCoherencyRequirements(device, "{\"maxOffsetNanos\":1000}", "",
+                                                    &status);
+  }
+  // Taking the source away brings the simulated clock back.
+  kosdlib_SyncableDevice_setOffsetSource(device, nullptr, nullptr, &status);
+  EXPECT_EQ(kosdlib_SyncableDevice_isCoherent(device, 250, &status), 1);
+  EXPECT_EQ(status.code, 0);
+  kosdlib_SyncableDevice_delete(device);
 }
 
 }  // namespace
