@@ -4,7 +4,7 @@ SHELL := /bin/bash
 JOBS ?= $(shell nproc)
 LISTEN ?= 127.0.0.1:8080
 
-.PHONY: run test deps release asan tsan tsan-test fuzz clean
+.PHONY: run run-ptp test deps release asan tsan tsan-test fuzz clean
 
 deps:
 	@scripts/install-deps.sh
@@ -21,6 +21,11 @@ asan: deps
 # simulated platform; Ctrl-C stops it.
 run: release
 	scripts/run.sh build/release $(LISTEN)
+
+# The same over live state: a master and a slave ptp4l daemon in network
+# namespaces (root needed); Ctrl-C stops the host and removes the domain.
+run-ptp: release
+	scripts/run-ptp.sh build/release $(LISTEN)
 
 # Builds everything under AddressSanitizer and UndefinedBehaviorSanitizer and
 # runs every test.

@@ -7,6 +7,7 @@ packages=(
   cmake ninja-build g++ pkg-config make locales
   libgtest-dev libgmock-dev libbenchmark-dev
   libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
+  linuxptp iproute2
 )
 # Extra sets for the optional tools: 'fuzz' and 'perf' (see README).
 for extra in "$@"; do

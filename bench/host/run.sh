@@ -25,6 +25,9 @@ build="$root/build/release"
 cmake --preset release -S "$root" >/dev/null
 cmake --build "$build" -j "$(nproc)" --target ws-runtime quillon ws_runtime_echo_plugin bare-http-daemon >/dev/null
 
+# shellcheck source=bench/host/common.sh
+source "$root/bench/host/common.sh"
+
 work=$(mktemp -d /tmp/bench-host-XXXXXX)
 chmod 755 "$work"
 pids=()
@@ -34,19 +37,6 @@ cleanup() {
   rm -rf "$work"
 }
 trap cleanup EXIT
-
-free_port() {
-  python3 -c 'import socket; s=socket.socket(); s.bind(("127.0.0.1",0)); print(s.getsockname()[1])'
-}
-
-wait_for() {  # url
-  for _ in $(seq 1 200); do
-    curl -fs -o /dev/null "$1" && return 0
-    sleep 0.05
-  done
-  echo "bench: $1 did not come up" >&2
-  exit 1
-}
 
 declare -A server  # target -> the pid whose threads, or worker processes, serve it
 start_host() {  # port plugin service target
@@ -109,32 +99,6 @@ for target in immediate quillon; do
     { echo "bench: nginx does not serve the same bytes for $target" >&2; exit 1; }
 done
 
-# CPU ticks used so far by each thread of the process and, for nginx, by each
-# worker process: "<id> <ticks>" per line.
-cpu_ticks() {  # pid
-  local unit
-  for unit in /proc/"$1"/task/* $(pgrep -P "$1" | sed 's|^|/proc/|'); do
-    awk -v id="${unit##*/}" '{ print id, $14 + $15 }' "$unit/stat" 2>/dev/null
-  done | sort
-}
-
-# One wrk run: prints "<requests/s> <p99 in ms> <busiest thread's CPU share>".
-measure() {  # url connections pid
-  local before after result busiest
-  before=$(cpu_ticks "$3")
-  result=$(wrk -t1 -c"$2" -d"$duration" --latency "$1" | awk '
-    /Requests\/sec/ { rps = $2 }
-    /^ +99%/ { v = $2; if (v ~ /us$/) { sub(/us/, "", v); v /= 1000 }
-               else if (v ~ /ms$/) { sub(/ms/, "", v) } else if (v ~ /s$/) { sub(/s/, "", v); v *= 1000 }
-               p99 = v }
-    END { printf "%.0f %.3f\n", rps, p99 }')
-  after=$(cpu_ticks "$3")
-  busiest=$(join <(echo "$before") <(echo "$after") |
-    awk '{ d = $3 - $2; total += d; if (d > max) max = d }
-         END { printf "%.2f", (total > 0 ? max / total : 0) }')
-  echo "$result $busiest"
-}
-
 declare -A sum
 printf '%-6s %-14s %5s %12s %10s %8s\n' round target conns 'req/s' 'p99 ms' busiest
 for round in $(seq 1 "$rounds"); do
@@ -146,7 +110,7 @@ for round in $(seq 1 "$rounds"); do
         bare) url="http://127.0.0.1:$bare_port/" ;;
         nginx-*) url="http://127.0.0.1:$nginx_port/${target#nginx-}" ;;
       esac
-      read -r rps p99 busiest < <(measure "$url" "$conns" "${server[$target]}")
+      read -r rps p99 busiest _ < <(measure "$url" "$conns" "${server[$target]}")
       printf '%-6s %-14s %5s %12s %10s %8s\n' "$round" "$target" "$conns" "$rps" "$p99" "$busiest"
       sum[$target-$conns]=$(( ${sum[$target-$conns]:-0} + rps ))
     done

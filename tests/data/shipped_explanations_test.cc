@@ -15,6 +15,7 @@ TEST(ShippedExplanations, ExplainEveryCodeThatCanReachAClient) {
       -52000, -52004, -52005, -52006, -52008,                      // portable
       -67303, -67310, -67311, -67312, -67313, 67320,               // host
       -1074100990, -1074100991, -1074100992, -1074100993, -1074100994,  // time service
+      -1074100995, -1074100996, -1074100997, -1074100998, -1074100999, -1074101000,  // live
   };
   for (int32_t code : codes) {
     SCOPED_TRACE(code);

@@ -1,0 +1,44 @@
+# Shell functions shared by the host benchmarks: free ports, waiting for a
+# server, and one measured wrk run. Sourced; needs $duration set.
+
+free_port() {
+  python3 -c 'import socket; s=socket.socket(); s.bind(("127.0.0.1",0)); print(s.getsockname()[1])'
+}
+
+wait_for() {  # url
+  for _ in $(seq 1 200); do
+    curl -fs -o /dev/null "$1" && return 0
+    sleep 0.05
+  done
+  echo "bench: $1 did not come up" >&2
+  exit 1
+}
+
+# CPU ticks used so far by each thread of the process and, for nginx, by each
+# worker process: "<id> <ticks>" per line.
+cpu_ticks() {  # pid
+  local unit
+  for unit in /proc/"$1"/task/* $(pgrep -P "$1" | sed 's|^|/proc/|'); do
+    awk -v id="${unit##*/}" '{ print id, $14 + $15 }' "$unit/stat" 2>/dev/null
+  done | sort
+}
+
+# One wrk run: prints "<requests/s> <p99 in ms> <busiest thread's CPU share>
+# <answers not 2xx or 3xx>".
+measure() {  # url connections pid
+  local before after result busiest rps p99 failed
+  before=$(cpu_ticks "$3")
+  result=$(wrk -t1 -c"$2" -d"$duration" --latency "$1" | awk '
+    /Requests\/sec/ { rps = $2 }
+    /Non-2xx or 3xx responses/ { failed = $NF }
+    /^ +99%/ { v = $2; if (v ~ /us$/) { sub(/us/, "", v); v /= 1000 }
+               else if (v ~ /ms$/) { sub(/ms/, "", v) } else if (v ~ /s$/) { sub(/s/, "", v); v *= 1000 }
+               p99 = v }
+    END { printf "%.0f %.3f %d\n", rps, p99, failed }')
+  after=$(cpu_ticks "$3")
+  busiest=$(join <(echo "$before") <(echo "$after") |
+    awk '{ d = $3 - $2; total += d; if (d > max) max = d }
+         END { printf "%.2f", (total > 0 ? max / total : 0) }')
+  read -r rps p99 failed <<< "$result"
+  echo "$rps $p99 $busiest $failed"
+}
