@@ -187,10 +187,12 @@ ssize_t UdsClient::receive(const std::string& serverPath, uint8_t* buffer, size_
     const size_t pathLength = fromLength > offsetof(sockaddr_un, sun_path)
                                   ? fromLength - offsetof(sockaddr_un, sun_path)
                                   : 0;
-    const bool fromServer = pathLength >= serverPath.size() &&
-                            std::memcmp(from.sun_path, serverPath.data(), serverPath.size()) == 0 &&
-                            (pathLength == serverPath.size() || from.sun_path[serverPath.size()] == '\0');
-    if (fromServer) return size;
+    // The daemon's answers come from its own socket; anything else is a stray.
+    if (pathLength >= serverPath.size() &&
+        std::memcmp(from.sun_path, serverPath.data(), serverPath.size()) == 0 &&
+        (pathLength == serverPath.size() || from.sun_path[serverPath.size()] == '\0')) {
+      return size;
+    }
   }
 }
 

@@ -238,7 +238,8 @@ TEST(LiveTimeService, DaemonFailuresNameTheReferenceTheSocketAndTheRequest) {
   FakeDaemon silent(sockets.file("q.sock"), [](const Answer&) { return std::vector<Bytes>{}; });
   Live live(config(tr("refusing", refusing.path(), ",\"port\":7") + "," +
                        tr("garbling", garbling.path()) + "," + tr("silent", silent.path()) + "," +
-                       tr("away", sockets.file("none.sock")),
+                       tr("away", sockets.file("none.sock")) + "," +
+                       tr("typed", sockets.file("none.sock"), ",\"type\":\"IEEE 1588-2008 BC\""),
                    ",\"timeoutMillis\":100"));
   const struct {
     const char* tr;
@@ -274,6 +275,8 @@ TEST(LiveTimeService, DaemonFailuresNameTheReferenceTheSocketAndTheRequest) {
     EXPECT_EQ(reply.code, c.code);
     EXPECT_EQ(reply.text, c.record);
   }
+  // A configured type needs no daemon.
+  EXPECT_EQ(live.attr("typed", "type").text, "{\"type\":\"IEEE 1588-2008 BC\"}");
   // Data sets that did answer are served all the same.
   EXPECT_EQ(live.attr("refusing", "gmClockId").text,
             "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}");

@@ -248,7 +248,8 @@ TEST_F(Ptp4lDomain, AStoppedMasterIsReportedAndUsedAgainOnceItIsBack) {
   const std::string socket = domainDir + "/master.sock";
   const std::vector<std::string> named = {
       "koapalerr_communicationsFault", "\\\"trId\\\":\\\"tr0\\\"",
-      "\\\"uds\\\":\\\"" + socket + "\\\"", "\\\"systemError\\\":\\\"No such file or directory\\\""};
+      "\\\"uds\\\":\\\"" + socket + "\\\"",
+      "\\\"systemError\\\":\\\"No such file or directory\\\""};
   // Answers already asked for may be served for a moment longer.
   test::HttpResponse listed;
   EXPECT_GT(whenTrue([&] {
@@ -260,7 +261,9 @@ TEST_F(Ptp4lDomain, AStoppedMasterIsReportedAndUsedAgainOnceItIsBack) {
   EXPECT_TRUE(errorNames(listed.body, -1074100995, named)) << listed.body;
   // The slave-only clock loses its master: it listens for another, and the
   // time keeper no longer knows its offset.
-  EXPECT_GT(whenTrue([] { return attr("tr1", "portState") == "{\"portState\":\"PTP_LISTENING\"}"; }),
+  EXPECT_GT(whenTrue([] {
+              return attr("tr1", "portState") == "{\"portState\":\"PTP_LISTENING\"}";
+            }),
             0);
   EXPECT_GT(whenTrue([] { return !timeKeeper().offsetKnown; }), 0);
   domain("start", "master");

@@ -146,8 +146,9 @@ TEST(UdsClient, ProbingEndsWithTheFirstAnswer) {
   auto requests = scene.requests(2);
   ASSERT_EQ(requests.size(), 2u);
   EXPECT_EQ(requests[1].first.transportSpecific, 1);
-  scene.daemon.sendTo(scene.client->path(),
-                      managementAnswer(requests[1].first, quillon::test_support::defaultDataSet(1)));
+  const Bytes answer =
+      managementAnswer(requests[1].first, quillon::test_support::defaultDataSet(1));
+  scene.daemon.sendTo(scene.client->path(), answer);
   const ExchangeOutcome result = outcome.get();
   EXPECT_FALSE(result.timedOut);
   EXPECT_FALSE(gets[0].answered);

@@ -23,7 +23,7 @@ class FromConfig : public TrAttribute {
  public:
   using Render = std::function<std::string(const TrConfig&)>;
   explicit FromConfig(Render render) : render_(std::move(render)) {}
-  bool needsDaemon() const override { return false; }
+  bool needsDaemon(const TrConfig&) const override { return false; }
   bool render(const TrConfig& tr, const DaemonState*, std::string* json,
               const Failure**) const override {
     *json = render_(tr);
@@ -41,7 +41,7 @@ class FromDataSet : public TrAttribute {
   using Render = std::function<std::string(const DataSet&)>;
   FromDataSet(Fetched<DataSet> DaemonState::*member, Render render)
       : member_(member), render_(std::move(render)) {}
-  bool needsDaemon() const override { return true; }
+  bool needsDaemon(const TrConfig&) const override { return true; }
   bool render(const TrConfig&, const DaemonState* state, std::string* json,
               const Failure** failure) const override {
     const Fetched<DataSet>& fetched = state->*member_;
@@ -61,7 +61,7 @@ class FromDataSet : public TrAttribute {
 // The configured type, or the one the daemon's transport and ports give.
 class TypeAttribute : public TrAttribute {
  public:
-  bool needsDaemon() const override { return true; }
+  bool needsDaemon(const TrConfig& tr) const override { return tr.type.empty(); }
   bool render(const TrConfig& tr, const DaemonState* state, std::string* json,
               const Failure** failure) const override {
     if (!tr.type.empty()) {
@@ -95,8 +95,9 @@ void addConfigAttributes(Table& table) {
 void addDefaultDataSet(Table& table) {
   using ptpmgmt::DefaultDataSet;
   constexpr auto kSet = &DaemonState::defaults;
-  add<DefaultDataSet>(table, "clockId", kSet,
-                      [](const DefaultDataSet& d) { return jsonString(formatClockIdentity(d.clockIdentity)); });
+  add<DefaultDataSet>(table, "clockId", kSet, [](const DefaultDataSet& d) {
+    return jsonString(formatClockIdentity(d.clockIdentity));
+  });
   add<DefaultDataSet>(table, "domainNumber", kSet,
                       [](const DefaultDataSet& d) { return jsonInt(d.domainNumber); });
   add<DefaultDataSet>(table, "numberPorts", kSet,

@@ -18,11 +18,11 @@ namespace kopdmlive {
 class TrAttribute {
  public:
   virtual ~TrAttribute() = default;
-  // False when the value comes from the configuration alone.
-  virtual bool needsDaemon() const = 0;
+  // False when the value for `tr` comes from the configuration alone.
+  virtual bool needsDaemon(const TrConfig& tr) const = 0;
   // The value as JSON; or false and `*failure` pointing into `state` when
-  // the data set it comes from could not be had. `state` is null exactly
-  // when needsDaemon() is false.
+  // the data set it comes from could not be had. `state` may be null when
+  // needsDaemon(tr) is false.
   virtual bool render(const TrConfig& tr, const DaemonState* state, std::string* json,
                       const Failure** failure) const = 0;
 };

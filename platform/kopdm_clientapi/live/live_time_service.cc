@@ -171,7 +171,9 @@ int32_t LiveTimeService::getSelectedTrOffsetNanos(int64_t* offsetOut, koerr::Sta
   DaemonLink* selected = selectedLink(*state);
   if (selected == nullptr) return reportNoSelectedTr(*status, kCall);
   const std::shared_ptr<const DaemonState> daemon = selected->state();
-  if (!daemon->timeStatus.ok) return reportFailure(*status, kCall, *selected, daemon->timeStatus.failure);
+  if (!daemon->timeStatus.ok) {
+    return reportFailure(*status, kCall, *selected, daemon->timeStatus.failure);
+  }
   *offsetOut = daemon->timeStatus.value.masterOffset;
   return 0;
 }
@@ -243,7 +245,7 @@ int32_t LiveTimeService::getTrAttrJson(const char* trId, const char* key, char* 
   if (attribute == nullptr) return reportNoAttr(*status, kCall, trId, key);
   // Held while the attribute renders: `failure` may point into it.
   std::shared_ptr<const DaemonState> daemon;
-  if (attribute->needsDaemon()) daemon = link->state();
+  if (attribute->needsDaemon(link->tr())) daemon = link->state();
   std::string value;
   const Failure* failure = nullptr;
   if (!attribute->render(link->tr(), daemon.get(), &value, &failure)) {
