@@ -14,12 +14,14 @@
 #   ptp-domain.sh sweep           remove domains whose creating process is gone
 #   ptp-domain.sh check           exit 0 when this machine can run a domain
 #
+# `up` also writes DIR/tr.json, the live time service's configuration for the
+# domain: time reference tr0 is the master, tr1 the slave.
 # PREFIX is "qptp" followed by the pid of the process that owns the domain
 # (at most 11 characters, so that interface names fit); `sweep` removes the
 # domains of owners that no longer run. Needs root, iproute2 and linuxptp.
 set -euo pipefail
 
-usage() { sed -n '2,21p' "$0" >&2; exit 2; }
+usage() { sed -n '2,23p' "$0" >&2; exit 2; }
 
 role_namespace() {  # DIR ROLE
   local prefix
@@ -118,6 +120,11 @@ domain_up() {  # DIR PREFIX
   write_config "$dir" slave
   start_daemon "$dir" master
   start_daemon "$dir" slave
+  cat > "$dir/tr.json" <<JSON
+{"timeReferences": [
+   {"id": "tr0", "uds": "$dir/master.sock"},
+   {"id": "tr1", "uds": "$dir/slave.sock"}]}
+JSON
 }
 
 domain_down() {  # DIR

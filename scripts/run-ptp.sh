@@ -25,11 +25,6 @@ trap 'exit 130' INT TERM
 
 "$domain" up "$dir" "qptp$$"
 "$domain" lock "$dir"
-cat > "$dir/tr.json" <<JSON
-{"timeReferences": [
-   {"id": "tr0", "uds": "$dir/master.sock"},
-   {"id": "tr1", "uds": "$dir/slave.sock"}]}
-JSON
 echo "run-ptp: ptp4l master (tr0) and slave (tr1) running; configuration $dir/tr.json," \
      "daemon logs $dir/master.log and $dir/slave.log"
 echo "run-ptp: drive the slave with: $domain unlock $dir   (and lock)"

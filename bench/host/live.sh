@@ -36,11 +36,6 @@ trap cleanup EXIT
 "$domain_script" sweep
 "$domain_script" up "$work/domain" "qptp$$"
 "$domain_script" lock "$work/domain"
-cat > "$work/tr.json" <<JSON
-{"timeReferences": [
-   {"id": "tr0", "uds": "$work/domain/master.sock"},
-   {"id": "tr1", "uds": "$work/domain/slave.sock"}]}
-JSON
 
 declare -A server port
 start_host() {  # target env...
@@ -54,7 +49,7 @@ start_host() {  # target env...
   wait_for "http://127.0.0.1:${port[$target]}/quillon/resources"
 }
 start_host simulated KOPDM_PTP4L_CONFIG=
-start_host live KOPDM_PTP4L_CONFIG="$work/tr.json"
+start_host live KOPDM_PTP4L_CONFIG="$work/domain/tr.json"
 
 # Both must be answering listings, the live one with the slave published.
 for _ in $(seq 1 100); do

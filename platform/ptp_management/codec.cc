@@ -112,18 +112,22 @@ class Writer {
   size_t position_ = 0;
 };
 
-// The data set's fields, when the answer carries that data set.
-template <typename DataSet>
-DecodeError openDataSet(const Answer& answer, Reader* reader) {
+// Reads a data set's fields with `read`, which returns what it found wrong
+// beyond length (kNone when nothing), when the answer carries that data set.
+template <typename DataSet, typename Read>
+DecodeError decodeFields(const Answer& answer, DataSet* out, Read&& read) {
   if (answer.isErrorStatus || answer.managementId != static_cast<uint16_t>(DataSet::kId)) {
     return DecodeError::kNotThisDataSet;
   }
-  *reader = Reader(answer.data, answer.dataSize);
-  return DecodeError::kNone;
+  Reader in(answer.data, answer.dataSize);
+  const DecodeError verdict = read(in, *out);
+  if (verdict != DecodeError::kNone) return verdict;
+  return in.complete() ? DecodeError::kNone : DecodeError::kDataTooShort;
 }
 
-DecodeError finish(const Reader& reader) {
-  return reader.complete() ? DecodeError::kNone : DecodeError::kDataTooShort;
+DecodeError checkPortState(const Reader& in, uint8_t state) {
+  if (!in.complete()) return DecodeError::kDataTooShort;
+  return portStateName(state) != nullptr ? DecodeError::kNone : DecodeError::kInvalidPortState;
 }
 
 }  // namespace
@@ -316,115 +320,96 @@ DecodeError decodeAnswer(const uint8_t* datagram, size_t size, Answer* out) {
 }
 
 DecodeError decodeDataSet(const Answer& answer, DefaultDataSet* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<DefaultDataSet>(answer, &in); error != DecodeError::kNone) {
-    return error;
-  }
-  const uint8_t flags = in.u8();
-  out->twoStep = (flags & 0x01) != 0;
-  out->slaveOnly = (flags & 0x02) != 0;
-  in.skip(1);
-  out->numberPorts = in.u16();
-  out->priority1 = in.u8();
-  out->quality = in.quality();
-  out->priority2 = in.u8();
-  out->clockIdentity = in.clock();
-  out->domainNumber = in.u8();
-  in.skip(1);
-  return finish(in);
+  return decodeFields(answer, out, [](Reader& in, DefaultDataSet& set) {
+    const uint8_t flags = in.u8();
+    set.twoStep = (flags & 0x01) != 0;
+    set.slaveOnly = (flags & 0x02) != 0;
+    in.skip(1);
+    set.numberPorts = in.u16();
+    set.priority1 = in.u8();
+    set.quality = in.quality();
+    set.priority2 = in.u8();
+    set.clockIdentity = in.clock();
+    set.domainNumber = in.u8();
+    in.skip(1);
+    return DecodeError::kNone;
+  });
 }
 
 DecodeError decodeDataSet(const Answer& answer, CurrentDataSet* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<CurrentDataSet>(answer, &in); error != DecodeError::kNone) {
-    return error;
-  }
-  out->stepsRemoved = in.u16();
-  out->offsetFromMaster = in.i64();
-  out->meanPathDelay = in.i64();
-  return finish(in);
+  return decodeFields(answer, out, [](Reader& in, CurrentDataSet& set) {
+    set.stepsRemoved = in.u16();
+    set.offsetFromMaster = in.i64();
+    set.meanPathDelay = in.i64();
+    return DecodeError::kNone;
+  });
 }
 
 DecodeError decodeDataSet(const Answer& answer, ParentDataSet* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<ParentDataSet>(answer, &in); error != DecodeError::kNone) {
-    return error;
-  }
-  out->parentPortIdentity = in.port();
-  out->parentStats = in.u8();
-  in.skip(1);
-  out->observedParentOffsetScaledLogVariance = in.u16();
-  out->observedParentClockPhaseChangeRate = in.i32();
-  out->grandmasterPriority1 = in.u8();
-  out->grandmasterQuality = in.quality();
-  out->grandmasterPriority2 = in.u8();
-  out->grandmasterIdentity = in.clock();
-  return finish(in);
+  return decodeFields(answer, out, [](Reader& in, ParentDataSet& set) {
+    set.parentPortIdentity = in.port();
+    set.parentStats = in.u8();
+    in.skip(1);
+    set.observedParentOffsetScaledLogVariance = in.u16();
+    set.observedParentClockPhaseChangeRate = in.i32();
+    set.grandmasterPriority1 = in.u8();
+    set.grandmasterQuality = in.quality();
+    set.grandmasterPriority2 = in.u8();
+    set.grandmasterIdentity = in.clock();
+    return DecodeError::kNone;
+  });
 }
 
 DecodeError decodeDataSet(const Answer& answer, TimePropertiesDataSet* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<TimePropertiesDataSet>(answer, &in);
-      error != DecodeError::kNone) {
-    return error;
-  }
-  out->currentUtcOffset = in.i16();
-  out->flags = in.u8();
-  out->timeSource = in.u8();
-  return finish(in);
+  return decodeFields(answer, out, [](Reader& in, TimePropertiesDataSet& set) {
+    set.currentUtcOffset = in.i16();
+    set.flags = in.u8();
+    set.timeSource = in.u8();
+    return DecodeError::kNone;
+  });
 }
 
 DecodeError decodeDataSet(const Answer& answer, PortDataSet* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<PortDataSet>(answer, &in); error != DecodeError::kNone) {
-    return error;
-  }
-  out->portIdentity = in.port();
-  out->portState = in.u8();
-  out->logMinDelayReqInterval = in.i8();
-  out->peerMeanPathDelay = in.i64();
-  out->logAnnounceInterval = in.i8();
-  out->announceReceiptTimeout = in.u8();
-  out->logSyncInterval = in.i8();
-  out->delayMechanism = in.u8();
-  out->logMinPdelayReqInterval = in.i8();
-  out->versionNumber = in.u8() & 0x0F;
-  if (!in.complete()) return DecodeError::kDataTooShort;
-  return portStateName(out->portState) != nullptr ? DecodeError::kNone
-                                                  : DecodeError::kInvalidPortState;
+  return decodeFields(answer, out, [](Reader& in, PortDataSet& set) {
+    set.portIdentity = in.port();
+    set.portState = in.u8();
+    set.logMinDelayReqInterval = in.i8();
+    set.peerMeanPathDelay = in.i64();
+    set.logAnnounceInterval = in.i8();
+    set.announceReceiptTimeout = in.u8();
+    set.logSyncInterval = in.i8();
+    set.delayMechanism = in.u8();
+    set.logMinPdelayReqInterval = in.i8();
+    set.versionNumber = in.u8() & 0x0F;
+    return checkPortState(in, set.portState);
+  });
 }
 
 DecodeError decodeDataSet(const Answer& answer, TimeStatusNp* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<TimeStatusNp>(answer, &in); error != DecodeError::kNone) {
-    return error;
-  }
-  out->masterOffset = in.i64();
-  out->ingressTime = in.i64();
-  out->cumulativeScaledRateOffset = in.i32();
-  out->scaledLastGmPhaseChange = in.i32();
-  out->gmTimeBaseIndicator = in.u16();
-  // lastGmPhaseChange: linuxptp 3.1 fills it wrongly, so it is not offered.
-  in.skip(12);
-  out->gmPresent = in.i32() != 0;
-  out->gmIdentity = in.clock();
-  return finish(in);
+  return decodeFields(answer, out, [](Reader& in, TimeStatusNp& set) {
+    set.masterOffset = in.i64();
+    set.ingressTime = in.i64();
+    set.cumulativeScaledRateOffset = in.i32();
+    set.scaledLastGmPhaseChange = in.i32();
+    set.gmTimeBaseIndicator = in.u16();
+    // lastGmPhaseChange: linuxptp 3.1 fills it wrongly, so it is not offered.
+    in.skip(12);
+    set.gmPresent = in.i32() != 0;
+    set.gmIdentity = in.clock();
+    return DecodeError::kNone;
+  });
 }
 
 DecodeError decodeDataSet(const Answer& answer, PortPropertiesNp* out) {
-  Reader in(nullptr, 0);
-  if (DecodeError error = openDataSet<PortPropertiesNp>(answer, &in);
-      error != DecodeError::kNone) {
-    return error;
-  }
-  out->portIdentity = in.port();
-  out->portState = in.u8();
-  out->timestamping = in.u8();
-  if (!in.complete() || in.remaining() < 1) return DecodeError::kDataTooShort;
-  out->interfaceName = in.text();
-  if (!in.complete()) return DecodeError::kTextBeyondData;
-  return portStateName(out->portState) != nullptr ? DecodeError::kNone
-                                                  : DecodeError::kInvalidPortState;
+  return decodeFields(answer, out, [](Reader& in, PortPropertiesNp& set) {
+    set.portIdentity = in.port();
+    set.portState = in.u8();
+    set.timestamping = in.u8();
+    if (!in.complete() || in.remaining() < 1) return DecodeError::kDataTooShort;
+    set.interfaceName = in.text();
+    if (!in.complete()) return DecodeError::kTextBeyondData;
+    return checkPortState(in, set.portState);
+  });
 }
 
 }  // namespace ptpmgmt

@@ -126,10 +126,8 @@ std::string attr(const char* tr, const char* key) {
 class Ptp4lDomain : public ::testing::Test {
  protected:
   static void SetUpTestSuite() {
+    // Written by the domain script: tr0 is the master, tr1 the slave.
     const std::string config = domainDir + "/tr.json";
-    std::ofstream(config) << "{\"timeReferences\":[{\"id\":\"tr0\",\"uds\":\"" << domainDir
-                          << "/master.sock\"},{\"id\":\"tr1\",\"uds\":\"" << domainDir
-                          << "/slave.sock\"}]}";
     ::setenv("KOPDM_PTP4L_CONFIG", config.c_str(), 1);
     const std::string marker = domainDir + "/share.dir";
     std::ofstream(marker) << QUILLON_SHARE_DIR;
