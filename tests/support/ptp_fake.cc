@@ -23,7 +23,7 @@ void put64(Bytes& out, int64_t value) {
 }
 
 void putClock(Bytes& out, const ptpmgmt::ClockIdentity& clock) {
-  out.insert(out.end(), clock.bytes.begin(), clock.bytes.end());
+  for (uint8_t byte : clock.bytes) out.push_back(byte);
 }
 
 ptpmgmt::ClockIdentity grandmasterClock() {
