@@ -76,7 +76,7 @@ def read_answer_log(path):
     return answers
 
 
-def served_answers(host, listing_first=True):
+def served_answers(host):
     """A request of every kind against one running host."""
     answers = [host.request("GET", "/quillon/resources")]
     for kind in ("timescales", "syncableDevices", "SyncableDevices"):
