@@ -4,7 +4,7 @@ SHELL := /bin/bash
 JOBS ?= $(shell nproc)
 LISTEN ?= 127.0.0.1:8080
 
-.PHONY: run run-ptp test deps release asan tsan tsan-test fuzz clean
+.PHONY: run run-ptp test deps release asan tsan tsan-test fuzz package package-test clean
 
 deps:
 	@scripts/install-deps.sh
@@ -41,6 +41,19 @@ fuzz:
 	@scripts/install-deps.sh fuzz
 	cmake --preset fuzz >/dev/null
 	cmake --build --preset fuzz -j $(JOBS)
+
+# The Debian packages (build/package/*.deb), from a release tree configured
+# for /usr.
+package:
+	@scripts/install-deps.sh package
+	cmake --preset package >/dev/null
+	cmake --build --preset package -j $(JOBS)
+	cd build/package && cpack -G DEB
+
+# Installs the packages into a scratch root with dpkg, serves the installed
+# plug-in from it, and removes them again (needs root).
+package-test: package
+	scripts/package-test.sh build/package
 
 clean:
 	rm -rf build

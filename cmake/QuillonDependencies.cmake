@@ -8,6 +8,9 @@ pkg_check_modules(LIBCURL REQUIRED IMPORTED_TARGET libcurl)
 if(QUILLON_BUILD_TESTS)
   find_package(GTest REQUIRED)
   include(GoogleTest)
+  # The Python checks use the distribution's interpreter, for which
+  # scripts/install-deps.sh installs python3-jsonschema and python3-yaml.
+  find_program(QUILLON_SYSTEM_PYTHON python3 PATHS /usr/bin NO_DEFAULT_PATH REQUIRED)
 endif()
 if(QUILLON_BUILD_BENCH)
   find_package(benchmark REQUIRED)

@@ -8,12 +8,14 @@ packages=(
   libgtest-dev libgmock-dev libbenchmark-dev
   libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
   linuxptp iproute2
+  python3 python3-jsonschema python3-yaml
 )
-# Extra sets for the optional tools: 'fuzz' and 'perf' (see README).
+# Extra sets for the optional tools: 'fuzz', 'perf' and 'package' (see README).
 for extra in "$@"; do
   case "$extra" in
     fuzz) packages+=(clang libclang-rt-14-dev) ;;
     perf) packages+=(wrk nginx-light linux-perf valgrind) ;;
+    package) packages+=(dpkg-dev binutils systemd) ;;
     *) echo "install-deps: unknown extra set '$extra'" >&2; exit 2 ;;
   esac
 done

@@ -11,6 +11,8 @@
 #include <cstring>
 #include <stdexcept>
 
+#include "support/answer_log.h"
+
 namespace quillon::test_support {
 
 namespace {
@@ -124,6 +126,7 @@ HttpResponse HttpClient::send(const HttpRequest& request) {
   }
   const auto connection = response.header("Connection");
   if (connection && ::strcasecmp(connection->c_str(), "close") == 0) closed_ = true;
+  logAnswer(request, response);
   return response;
 }
 

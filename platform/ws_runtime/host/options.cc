@@ -3,6 +3,7 @@
 #include <arpa/inet.h>
 
 #include <charconv>
+#include <filesystem>
 #include <thread>
 
 namespace ws::host {
@@ -14,6 +15,22 @@ namespace ws::host {
 namespace {
 
 constexpr unsigned kMaxThreads = 256;
+
+// A default that starts with "$ORIGIN/" lies relative to the folder of the
+// running host, so that one binary finds its plug-in in the build tree and
+// where it is installed without naming either. The loader's own $ORIGIN
+// cannot serve: under a sanitizer the dlopen call comes from the sanitizer's
+// runtime, not from the host.
+std::string defaultPluginPath() {
+  const std::string configured = WS_RUNTIME_DEFAULT_PLUGIN;
+  const std::string origin = "$ORIGIN/";
+  if (configured.compare(0, origin.size(), origin) != 0) return configured;
+  std::error_code error;
+  const std::filesystem::path host = std::filesystem::read_symlink("/proc/self/exe", error);
+  // Without /proc the path stays relative, and dlopen names it in its error.
+  if (error) return configured.substr(origin.size());
+  return (host.parent_path() / configured.substr(origin.size())).lexically_normal().string();
+}
 
 bool parseUnsigned(const std::string& text, uint64_t& value) {
   const char* end = text.data() + text.size();
@@ -38,7 +55,7 @@ std::string usage() {
          "                  [--threads N] [--max-body BYTES] [--quiet]\n"
          "  --listen    numeric address and port, e.g. 127.0.0.1:8080 or [::1]:8080;\n"
          "              port 0 picks a free one (default 127.0.0.1:8080)\n"
-         "  --plugin    the plug-in library (default " WS_RUNTIME_DEFAULT_PLUGIN ")\n"
+         "  --plugin    the plug-in library (default " + defaultPluginPath() + ")\n"
          "  --service   the entry-point prefix and mount point /NAME (default quillon)\n"
          "  --threads   request threads, 1.." + std::to_string(kMaxThreads) +
          " (default: one per processor)\n"
@@ -67,7 +84,7 @@ bool parseListenAddress(const std::string& text, sockaddr_storage& address) {
 
 std::optional<Options> parseOptions(const std::vector<std::string>& args, std::string& error) {
   Options options;
-  options.pluginPath = WS_RUNTIME_DEFAULT_PLUGIN;
+  options.pluginPath = defaultPluginPath();
   for (size_t i = 0; i < args.size(); ++i) {
     const std::string& flag = args[i];
     if (flag == "--quiet") {

@@ -17,7 +17,7 @@ namespace ws::host {
 struct Options {
   std::string listen = "127.0.0.1:8080";
   sockaddr_storage address{};  // `listen`, parsed
-  std::string pluginPath;      // defaults to the plug-in the build produces
+  std::string pluginPath;      // defaults to the plug-in beside the host's build or installation
   std::string service = "quillon";
   unsigned threads = 0;        // defaults to the number of processors
   uint64_t maxBody = 1024 * 1024;
