@@ -1,5 +1,6 @@
 #include "quillon/service.h"
 
+#include <string_view>
 #include <utility>
 
 #include "error_record/constants.h"
@@ -70,11 +71,14 @@ std::string processPut(ResourceManagerInterface& resourceManager, const std::str
 }  // namespace
 
 std::string buildResourceUri(const std::string& command, RequestInterface& request) {
-  std::string uri = "/quillon/" + command;
-  for (const char* variable : {"plugin", "type", "name"}) {
-    uri += '/';
-    uri += request.getUriVariable(variable);
-  }
+  constexpr std::string_view kRoot = "/quillon/";
+  const std::string plugin = request.getUriVariable("plugin");
+  const std::string type = request.getUriVariable("type");
+  const std::string name = request.getUriVariable("name");
+  std::string uri;
+  uri.reserve(kRoot.size() + command.size() + plugin.size() + type.size() + name.size() + 3);
+  uri.append(kRoot).append(command).append(1, '/').append(plugin).append(1, '/').append(type)
+      .append(1, '/').append(name);
   return uri;
 }
 
@@ -132,7 +136,7 @@ std::unique_ptr<RequestInterface> Service::handleRequest(std::unique_ptr<Request
         translateCurrentException(status);
       }
     }
-    const std::string envelope = buildEnvelope(local, result);
+    const std::string envelope = buildEnvelope(local, std::move(result));
     if (local.code != 0) {
       // The negative code goes to the host as the HTTP status, unmapped.
       request->setHTTPResponseCode(local.code);
