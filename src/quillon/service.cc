@@ -21,6 +21,13 @@ struct LocalStatus : koerr::Status {
   ~LocalStatus() { koerr::releaseText(*this); }
 };
 
+// The MIME type of every answer, as the text the request takes, built once
+// instead of once per answer.
+const std::string& mediaTypeText() {
+  static const std::string text(kMediaType);
+  return text;
+}
+
 bool contentTypeAcceptable(const std::string& contentType) {
   return contentType.empty() || contentType == kMediaType;
 }
@@ -142,7 +149,7 @@ std::unique_ptr<RequestInterface> Service::handleRequest(std::unique_ptr<Request
       request->setHTTPResponseCode(local.code);
     }
     request->writeOutput(envelope);
-    request->setHTTPResponseMimeType(kMediaType);
+    request->setHTTPResponseMimeType(mediaTypeText());
   } catch (...) {
     translateCurrentException(status);
   }
