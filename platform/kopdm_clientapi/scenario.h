@@ -25,23 +25,6 @@ enum class Call {
 };
 const char* callName(Call call);
 
-// The order of std::less on strings (bytes compared unsigned, then length),
-// found by a loop the compiler keeps inline: names of TRs and attributes are
-// a few bytes long, and a call into the C library's memcmp for each step of
-// a lookup cost more than the comparison itself.
-struct ShortTextLess {
-  using is_transparent = void;
-  bool operator()(std::string_view a, std::string_view b) const noexcept {
-    const std::size_t common = a.size() < b.size() ? a.size() : b.size();
-    for (std::size_t i = 0; i < common; ++i) {
-      const auto x = static_cast<unsigned char>(a[i]);
-      const auto y = static_cast<unsigned char>(b[i]);
-      if (x != y) return x < y;
-    }
-    return a.size() < b.size();
-  }
-};
-
 // Attribute key -> its answer {"<key>":<value>}.
 using AnswerMap = std::map<std::string, std::string, ShortTextLess>;
 
