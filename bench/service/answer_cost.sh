@@ -5,7 +5,12 @@
 # whatever else the machine is doing; each kind runs twice, for REQUESTS/5
 # and REQUESTS requests, and the difference leaves out start-up.
 #
-# Usage: bench/service/answer_cost.sh [REQUESTS]   (default 5000; release build)
+# With KOPDM_PTP4L_CONFIG naming a live configuration (scripts/ptp-domain.sh
+# writes one), the time service is the live one over ptp4l daemons; its
+# listing is the one kind that applies: KINDS=resources.
+#
+# Usage: [KINDS="resources ..."] bench/service/answer_cost.sh [REQUESTS]
+#        (default 5000 requests, all three kinds; release build)
 set -euo pipefail
 requests=${1:-5000}
 few=$((requests / 5))
@@ -25,7 +30,7 @@ count() {  # kind requests
   awk '/^summary:/ { print $2 }' "$work/out"
 }
 
-for kind in resources timescale error; do
+for kind in ${KINDS:-resources timescale error}; do
   low=$(count "$kind" "$few")
   high=$(count "$kind" "$requests")
   allocations=$("$build/bin/answer_cost" "$kind" "$requests")
