@@ -62,6 +62,7 @@ constexpr std::string_view kResultMember = R"(,"result":)";
 constexpr std::string_view kSuccessWithResult =
     R"({"error":{"success":true,"errorCode":0,"errorText":""},"result":)";
 static_assert(kSuccessWithResult.size() == kSuccessError.size() + kResultMember.size());
+static_assert(kEnvelopeRoom == kSuccessWithResult.size() + 1);
 
 std::string plainSuccessEnvelope(const std::string& result) {
   std::string answer;
@@ -87,7 +88,6 @@ std::string plainSuccessEnvelope(std::string&& result) {
 
 }  // namespace
 
-const std::size_t kEnvelopeRoom = kSuccessWithResult.size() + 1;
 
 std::string buildEnvelope(const koerr::Status& status, std::string&& result) {
   if (isPlainSuccess(status, result)) return plainSuccessEnvelope(std::move(result));

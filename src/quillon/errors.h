@@ -25,7 +25,7 @@ std::string buildEnvelope(const koerr::Status& status, const std::string& result
 // do without allocating.
 std::string buildEnvelope(const koerr::Status& status, std::string&& result);
 // What a success envelope adds around its result.
-extern const std::size_t kEnvelopeRoom;
+inline constexpr std::size_t kEnvelopeRoom = 65;
 
 // To be called inside a catch block: rethrows the exception in flight and
 // records it in `status` (first error wins): a koerr record is copied; a
