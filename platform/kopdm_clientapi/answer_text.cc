@@ -12,6 +12,34 @@ namespace {
 // A configuration is a hand-written file; anything larger is a mistake.
 constexpr long kMaxFileBytes = 16L * 1024 * 1024;
 
+// Whether JSON text writes these bytes as they are: no quote, backslash or
+// control character.
+bool needsNoEscape(std::string_view text) {
+  for (const char byte : text) {
+    const auto c = static_cast<unsigned char>(byte);
+    if (c < 0x20 || c == 0x7f || c == '"' || c == '\\') return false;
+  }
+  return true;
+}
+
+// Writes pieces one after another into a buffer, cutting what does not fit.
+class CutWriter {
+ public:
+  CutWriter(char* out, size_t room) : out_(out), room_(room) {}
+  CutWriter& operator<<(std::string_view piece) {
+    const size_t length = piece.size() < room_ ? piece.size() : room_;
+    std::memcpy(out_, piece.data(), length);
+    out_ += length;
+    room_ -= length;
+    return *this;
+  }
+  void terminate() { *out_ = '\0'; }
+
+ private:
+  char* out_;
+  size_t room_;
+};
+
 }  // namespace
 
 bool readTextFile(const std::string& path, std::string* text, std::string* problem) {
@@ -40,6 +68,17 @@ void copyAnswer(std::string_view answer, char* buffer, uint32_t capacity) {
   const size_t length = answer.size() < capacity ? answer.size() : capacity - 1;
   std::memcpy(buffer, answer.data(), length);
   buffer[length] = '\0';
+}
+
+void copyMember(std::string_view key, std::string_view valueJson, char* buffer,
+                uint32_t capacity) {
+  if (!needsNoEscape(key)) {
+    copyAnswer(renderMember(key, valueJson), buffer, capacity);
+    return;
+  }
+  CutWriter writer(buffer, capacity - 1);
+  writer << "{\"" << key << "\":" << valueJson << "}";
+  writer.terminate();
 }
 
 std::string renderMember(std::string_view key, std::string_view valueJson) {

@@ -8,7 +8,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <functional>
 #include <map>
 #include <string>
 #include <string_view>
@@ -27,13 +26,13 @@ enum class Call {
 const char* callName(Call call);
 
 // Attribute key -> its answer {"<key>":<value>}.
-using AnswerMap = std::map<std::string, std::string, std::less<>>;
+using AnswerMap = std::map<std::string, std::string, ShortTextLess>;
 
 struct TimeReference {
   AnswerMap attrAnswers;
   std::string metadataAnswer;
 };
-using TimeReferences = std::map<std::string, TimeReference, std::less<>>;
+using TimeReferences = std::map<std::string, TimeReference, ShortTextLess>;
 
 struct Fault {
   Call call = Call::kGetApiVersion;

@@ -188,8 +188,14 @@ char* leaveContainer(char* cursor) { return cursor != nullptr ? cursor + 1 : nul
 
 void appendJsonEscaped(std::string& out, std::string_view text) {
   const Piece piece{text.data(), text.size(), true};
+  const size_t length = pieceLength(piece) - 2;  // the length counts the quotes
+  // Most texts need no escape: then they are copied as they are.
+  if (length == text.size()) {
+    out.append(text);
+    return;
+  }
   const size_t start = out.size();
-  out.resize(start + pieceLength(piece) - 2);  // the length counts the quotes
+  out.resize(start + length);
   writeEscapedBody(&out[start], piece);
 }
 

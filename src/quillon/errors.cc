@@ -57,21 +57,42 @@ bool isPlainSuccess(const koerr::Status& status, const std::string& result) {
          result.find('\0') == std::string::npos && result.size() < kPlainResultLimit;
 }
 
+constexpr std::string_view kSuccessError = R"({"error":{"success":true,"errorCode":0,"errorText":""})";
+constexpr std::string_view kResultMember = R"(,"result":)";
+constexpr std::string_view kSuccessWithResult =
+    R"({"error":{"success":true,"errorCode":0,"errorText":""},"result":)";
+static_assert(kSuccessWithResult.size() == kSuccessError.size() + kResultMember.size());
+static_assert(kEnvelopeRoom == kSuccessWithResult.size() + 1);
+
 std::string plainSuccessEnvelope(const std::string& result) {
-  constexpr std::string_view kError = R"({"error":{"success":true,"errorCode":0,"errorText":""})";
-  constexpr std::string_view kResult = R"(,"result":)";
   std::string answer;
-  answer.reserve(kError.size() + kResult.size() + result.size() + 1);
-  answer += kError;
+  answer.reserve(kSuccessError.size() + kResultMember.size() + result.size() + 1);
+  answer += kSuccessError;
   if (!result.empty()) {
-    answer += kResult;
+    answer += kResultMember;
     answer += result;
   }
   answer += '}';
   return answer;
 }
 
+// The result's bytes move up in place; only a result without the spare room
+// for the envelope costs an allocation here.
+std::string plainSuccessEnvelope(std::string&& result) {
+  if (result.empty()) return plainSuccessEnvelope(result);
+  std::string answer = std::move(result);
+  answer.insert(0, kSuccessWithResult.data(), kSuccessWithResult.size());
+  answer += '}';
+  return answer;
+}
+
 }  // namespace
+
+
+std::string buildEnvelope(const koerr::Status& status, std::string&& result) {
+  if (isPlainSuccess(status, result)) return plainSuccessEnvelope(std::move(result));
+  return buildEnvelope(status, static_cast<const std::string&>(result));
+}
 
 std::string buildEnvelope(const koerr::Status& status, const std::string& result) {
   if (isPlainSuccess(status, result)) return plainSuccessEnvelope(result);

@@ -5,6 +5,7 @@
 #ifndef QUILLON_QUILLON_ERRORS_H_
 #define QUILLON_QUILLON_ERRORS_H_
 
+#include <cstddef>
 #include <string>
 
 #include "error_record/status.h"
@@ -19,6 +20,12 @@ namespace quillon {
 // Never throws for a failed explanation lookup; running out of memory only
 // shortens the envelope.
 std::string buildEnvelope(const koerr::Status& status, const std::string& result);
+// The same text; a success without details is built in `result`'s own
+// storage, which a document reserved with kEnvelopeRoom spare bytes lets it
+// do without allocating.
+std::string buildEnvelope(const koerr::Status& status, std::string&& result);
+// What a success envelope adds around its result.
+inline constexpr std::size_t kEnvelopeRoom = 65;
 
 // To be called inside a catch block: rethrows the exception in flight and
 // records it in `status` (first error wins): a koerr record is copied; a

@@ -3,6 +3,8 @@
 #include <cstring>
 #include <memory>
 #include <stdexcept>
+#include <string_view>
+#include <utility>
 
 #include "error_record/error.h"
 #include "ws_runtime/ws_runtime.h"
@@ -55,6 +57,18 @@ std::u32string widen(const std::string& text) {
   std::u32string out(text.size(), U'\0');
   for (size_t i = 0; i < text.size(); ++i) out[i] = static_cast<unsigned char>(text[i]);
   return out;
+}
+
+// The names the service reads, widened once, so that looking one up costs
+// no allocation for its name.
+const std::u32string* knownWideName(const std::string& key) {
+  static const std::pair<std::string_view, std::u32string> kNames[] = {
+      {"resourceType", U"resourceType"}, {"plugin", U"plugin"}, {"type", U"type"},
+      {"name", U"name"}};
+  for (const auto& [name, wide] : kNames) {
+    if (key == name) return &wide;
+  }
+  return nullptr;
 }
 
 }  // namespace
@@ -110,9 +124,11 @@ std::string Request::readPostData() {
 }
 
 std::string Request::getUriVariable(const std::string& key) {
-  std::u32string value;
-  _info->lookupVariable(widen(key), value);
-  return narrow(value);
+  const std::u32string* known = knownWideName(key);
+  // A variable the request lacks leaves the value alone: it reads as "".
+  variableValue_.clear();
+  _info->lookupVariable(known != nullptr ? *known : widen(key), variableValue_);
+  return narrow(variableValue_);
 }
 
 void Request::setHTTPResponseCode(int code) {

@@ -39,6 +39,9 @@ class Request : public RequestInterface {
 
   uint32_t _requestID;
   ws::runtime::RequestInfo* _info;
+  // Reused by every URL variable read, so that a request's reads share one
+  // buffer.
+  std::u32string variableValue_;
 };
 
 }  // namespace quillon

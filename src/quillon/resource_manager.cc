@@ -1,10 +1,13 @@
 #include "quillon/resource_manager.h"
 
+#include <cstring>
 #include <stdexcept>
+#include <string_view>
 #include <utility>
 #include <vector>
 
 #include "error_record/error.h"
+#include "quillon/errors.h"
 #include "syncable_device/syncable_device_actual.h"
 
 namespace quillon {
@@ -25,17 +28,19 @@ void appendUriEntry(std::string& out, const std::string& uri) {
 // The grandmaster identity is the URI's last segment written as a clock
 // identity: dashes become colons, capitals become small letters. ASCII-only
 // lowering is what tolower does in the "C" locale the plug-in runs under.
-std::string grandmasterIdFromUri(const std::string& uri) {
+// Appended straight to the document.
+void appendGrandmasterId(std::string& out, const std::string& uri) {
   const std::string::size_type slash = uri.rfind('/');
-  std::string id = slash == std::string::npos ? uri : uri.substr(slash + 1);
-  for (char& c : id) {
+  const std::size_t start = out.size();
+  out.append(uri, slash == std::string::npos ? 0 : slash + 1, std::string::npos);
+  for (std::size_t i = start; i < out.size(); ++i) {
+    char& c = out[i];
     if (c == '-') {
       c = ':';
     } else if (c >= 'A' && c <= 'Z') {
       c = static_cast<char>(c - 'A' + 'a');
     }
   }
-  return id;
 }
 
 std::string quotedList(const std::vector<std::string>& uris) {
@@ -66,34 +71,41 @@ ResourceManager::ResourceManager(
 ResourceManager::~ResourceManager() = default;
 
 std::string ResourceManager::getResources(const std::string& resourceType) {
+  constexpr std::string_view kHead = "{\"version\":1,\"resources\":[";
+  constexpr std::string_view kEntryHead = "{\"uri\":\"";
+  constexpr std::string_view kEntryTail = "\"},";
   const bool all = resourceType.empty();
+  const bool listsDevice = all || resourceType == "syncableDevices";
+  const bool listsTimescales = all || resourceType == "timescales";
+  // Both are asked for before anything is written, in this order, so that
+  // the document can be sized once; the timescales are asked for even when
+  // the device has no URI, so their errors still reach the client.
+  const char* deviceUri = listsDevice ? localDevice_->getUri() : nullptr;
+  std::vector<std::string> uris;
+  if (listsTimescales) uris = timescaleHelpers_->getTimescaleUris();
+
+  std::size_t size = kHead.size() + 2;
+  if (deviceUri != nullptr) size += kEntryHead.size() + std::strlen(deviceUri) + kEntryTail.size();
+  for (const std::string& uri : uris) size += kEntryHead.size() + uri.size() + kEntryTail.size();
   std::string out;
-  out.reserve(256);
-  out += "{\"version\":1,\"resources\":[";
-  // A device without a URI ends the document at that point, as a failed
-  // stream write would; the timescales are still asked for, so their errors
-  // still reach the client.
-  bool cut = false;
-  if (all || resourceType == "syncableDevices") {
-    out += "{\"uri\":\"";
-    const char* deviceUri = localDevice_->getUri();
-    if (deviceUri == nullptr) {
-      cut = true;
-    } else {
-      out += deviceUri;
-      out += "\"}";
-      if (all) out += ',';
-    }
+  // The envelope is later written around the document in the same storage.
+  out.reserve(size + kEnvelopeRoom);
+  out += kHead;
+  if (listsDevice) {
+    out += kEntryHead;
+    // A device without a URI ends the document at that point, as a failed
+    // stream write would.
+    if (deviceUri == nullptr) return out;
+    out += deviceUri;
+    out += "\"}";
+    if (all) out += ',';
   }
-  if (all || resourceType == "timescales") {
-    const std::vector<std::string> uris = timescaleHelpers_->getTimescaleUris();
-    if (cut) return out;
+  if (listsTimescales) {
     for (const std::string& uri : uris) appendUriEntry(out, uri);
     // Always one step back: it drops the trailing comma, and with no entries
     // at all it drops the character before them ("[" or the device's ",").
     out.pop_back();
   }
-  if (cut) return out;
   out += "]}";
   return out;
 }
@@ -125,13 +137,13 @@ std::string ResourceManager::getTimescale(const std::string& uri) {
   const std::vector<std::string> uris = timescaleHelpers_->getTimescaleUris();
   for (const std::string& current : uris) {
     if (current != uri) continue;
-    const std::string gmId = grandmasterIdFromUri(uri);
     std::string out;
-    out.reserve(64 + uri.size() + gmId.size());
+    // The identity is no longer than the URI; the envelope goes around it.
+    out.reserve(64 + 2 * uri.size() + kEnvelopeRoom);
     out += "{\"version\":1,\"uri\":\"";
     out += uri;
     out += "\",\"data\":{\"grandmasterId\":\"";
-    out += gmId;
+    appendGrandmasterId(out, uri);
     out += "\"}}";
     return out;
   }

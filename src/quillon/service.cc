@@ -1,5 +1,6 @@
 #include "quillon/service.h"
 
+#include <string_view>
 #include <utility>
 
 #include "error_record/constants.h"
@@ -19,6 +20,13 @@ struct LocalStatus : koerr::Status {
   LocalStatus& operator=(const LocalStatus&) = delete;
   ~LocalStatus() { koerr::releaseText(*this); }
 };
+
+// The MIME type of every answer, as the text the request takes, built once
+// instead of once per answer.
+const std::string& mediaTypeText() {
+  static const std::string text(kMediaType);
+  return text;
+}
 
 bool contentTypeAcceptable(const std::string& contentType) {
   return contentType.empty() || contentType == kMediaType;
@@ -70,11 +78,14 @@ std::string processPut(ResourceManagerInterface& resourceManager, const std::str
 }  // namespace
 
 std::string buildResourceUri(const std::string& command, RequestInterface& request) {
-  std::string uri = "/quillon/" + command;
-  for (const char* variable : {"plugin", "type", "name"}) {
-    uri += '/';
-    uri += request.getUriVariable(variable);
-  }
+  constexpr std::string_view kRoot = "/quillon/";
+  const std::string plugin = request.getUriVariable("plugin");
+  const std::string type = request.getUriVariable("type");
+  const std::string name = request.getUriVariable("name");
+  std::string uri;
+  uri.reserve(kRoot.size() + command.size() + plugin.size() + type.size() + name.size() + 3);
+  uri.append(kRoot).append(command).append(1, '/').append(plugin).append(1, '/').append(type)
+      .append(1, '/').append(name);
   return uri;
 }
 
@@ -132,13 +143,13 @@ std::unique_ptr<RequestInterface> Service::handleRequest(std::unique_ptr<Request
         translateCurrentException(status);
       }
     }
-    const std::string envelope = buildEnvelope(local, result);
+    const std::string envelope = buildEnvelope(local, std::move(result));
     if (local.code != 0) {
       // The negative code goes to the host as the HTTP status, unmapped.
       request->setHTTPResponseCode(local.code);
     }
     request->writeOutput(envelope);
-    request->setHTTPResponseMimeType(kMediaType);
+    request->setHTTPResponseMimeType(mediaTypeText());
   } catch (...) {
     translateCurrentException(status);
   }

@@ -127,6 +127,24 @@ TEST(TimescaleHelpers, ComposedOperationsGoThroughOverrides) {
   } helpers(service.client);
   EXPECT_EQ(helpers.getFirstTrTimescaleUri(), "/quillon/timescales/pendulo/x/gm-of-x");
   EXPECT_EQ(helpers.getTimescaleUris(), Strings{"/quillon/timescales/pendulo/x/gm-of-x"});
+
+  // A replacement that hands back another string makes that string the URI.
+  struct Replacing : kosdtools::pendulo::TimescaleHelpers {
+    using TimescaleHelpers::TimescaleHelpers;
+    std::string getTrGmId(const std::string&) override { return "g m"; }
+    std::string& replaceSpacesWithDashes(std::string&) override { return other; }
+    std::string other = "elsewhere";
+  } replacing(service.client);
+  EXPECT_EQ(replacing.getTimescaleUri("x"), "elsewhere");
+
+  kosdtools::pendulo::TimescaleHelpers plain(service.client);
+  for (const char* text : {"", " ", "  a  b ", "no-space"}) {
+    SCOPED_TRACE(text);
+    std::string replaced = text;
+    std::string expected = text;
+    for (char& c : expected) c = c == ' ' ? '-' : c;
+    EXPECT_EQ(plain.replaceSpacesWithDashes(replaced), expected);
+  }
 }
 
 TEST(TimescaleHelpers, TrAttributeErrorsNameTheTrAndKeepTheServiceError) {

@@ -4,6 +4,7 @@
 #include <map>
 #include <memory>
 
+#include "answer_text.h"
 #include "error_record/json_text.h"
 
 namespace kopdmlive {
@@ -77,7 +78,7 @@ class TypeAttribute : public TrAttribute {
   }
 };
 
-using Table = std::map<std::string, std::unique_ptr<TrAttribute>, std::less<>>;
+using Table = std::map<std::string, std::unique_ptr<TrAttribute>, kopdmsim::ShortTextLess>;
 
 template <typename DataSet>
 void add(Table& table, const char* key, Fetched<DataSet> DaemonState::*member,
@@ -255,7 +256,9 @@ std::string derivedType(uint8_t transportSpecific, uint16_t numberPorts) {
 }
 
 std::string jsonString(std::string_view text) {
-  std::string json = "\"";
+  std::string json;
+  json.reserve(text.size() + 2);  // the common case, nothing to escape
+  json += '"';
   koerr::appendJsonEscaped(json, text);
   json += '"';
   return json;

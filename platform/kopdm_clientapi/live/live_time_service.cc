@@ -204,7 +204,7 @@ int32_t LiveTimeService::getPdmAttrJson(const char* key, char* buffer, uint32_t 
   } else {
     return reportNoAttr(*status, kCall, {}, wanted);
   }
-  kopdmsim::copyAnswer(kopdmsim::renderMember(wanted, value), buffer, capacity);
+  kopdmsim::copyMember(wanted, value, buffer, capacity);
   return 0;
 }
 
@@ -251,7 +251,7 @@ int32_t LiveTimeService::getTrAttrJson(const char* trId, const char* key, char* 
   if (!attribute->render(link->tr(), daemon.get(), &value, &failure)) {
     return reportFailure(*status, kCall, *link, *failure);
   }
-  kopdmsim::copyAnswer(kopdmsim::renderMember(key, value), buffer, capacity);
+  kopdmsim::copyMember(key, value, buffer, capacity);
   return 0;
 }
 

@@ -30,6 +30,11 @@ TEST(EnvelopeTest, CarriesCodeExplanationRecordAndResult) {
     std::string result;
     std::string expected;
   } cases[] = {
+      {"plain success", success, "{\"version\":1}",
+       "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"},\"result\":"
+       "{\"version\":1}}"},
+      {"success without result", success, "",
+       "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"}}"},
       // The result is written as a C string, so a NUL byte ends it.
       {"result with a NUL byte", success, std::string("{\"a\"\0,\"b\":1}", 12),
        "{\"error\":{\"success\":true,\"errorCode\":0,\"errorText\":\"\"},\"result\":{\"a\"}"},
@@ -44,6 +49,13 @@ TEST(EnvelopeTest, CarriesCodeExplanationRecordAndResult) {
   for (const Case& c : cases) {
     SCOPED_TRACE(c.name);
     EXPECT_EQ(quillon::buildEnvelope(c.status, c.result), c.expected);
+    // Handed over, the result's storage is reused, with or without the room.
+    for (const std::size_t room : {std::size_t{0}, quillon::kEnvelopeRoom}) {
+      std::string owned;
+      owned.reserve(c.result.size() + room);
+      owned = c.result;
+      EXPECT_EQ(quillon::buildEnvelope(c.status, std::move(owned)), c.expected) << room;
+    }
   }
 }
 

@@ -198,8 +198,17 @@ TEST_F(RequestTest, CommandAndVariablesKeepTheLowByteOfEachCharacter) {
       }));
   // U+1F600 keeps its low byte 0x00.
   EXPECT_EQ(request.getUriVariable("n\xE9"), std::string("\0x", 2));
+  // A variable the request lacks reads as "", not as the one read before.
   EXPECT_CALL(info, lookupVariable(std::u32string(U"resourceType"), _)).WillOnce(Return(false));
   EXPECT_EQ(request.getUriVariable("resourceType"), "");
+  EXPECT_CALL(info, lookupVariable(std::u32string(U"name"), _))
+      .WillOnce(Invoke([](const std::u32string&, std::u32string& value) {
+        value = U"gm";
+        return true;
+      }));
+  EXPECT_EQ(request.getUriVariable("name"), "gm");
+  EXPECT_CALL(info, lookupVariable(std::u32string(U"plugin"), _)).WillOnce(Return(false));
+  EXPECT_EQ(request.getUriVariable("plugin"), "");
 }
 
 }  // namespace
