@@ -11,9 +11,10 @@
 namespace kopdmsim {
 namespace {
 
-// Plain writes show up once, at close, so a half-written file is never read.
+// Writes in place are watched too (IN_MODIFY, truncation included), only to
+// know that the file is incomplete until its writer closes it.
 constexpr uint32_t kEvents =
-    IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB;
+    IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB | IN_MODIFY;
 
 std::string directoryOf(const std::string& path) {
   const std::size_t slash = path.rfind('/');
@@ -54,7 +55,7 @@ ScenarioWatch::~ScenarioWatch() {
 }
 
 void ScenarioWatch::run() {
-  alignas(struct inotify_event) char events[4096];
+  const StillSettled stillSettled = [this] { return !drainEvents() && !writing_; };
   for (;;) {
     pollfd fds[2] = {{inotifyFd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
     if (poll(fds, 2, -1) < 0) {
@@ -62,24 +63,44 @@ void ScenarioWatch::run() {
       return;
     }
     if (fds[1].revents != 0) return;
-    bool changed = false;
-    for (;;) {
-      const ssize_t length = read(inotifyFd_, events, sizeof events);
-      if (length <= 0) break;
-      changed = changed || concernsFile(events, length);
+    drainEvents();
+    // What happened while the callback read the file is in the flags by
+    // now, so a dropped read is followed by another once the file settles.
+    while (pending_ && !writing_) {
+      pending_ = false;
+      onChange_(stillSettled);
     }
-    if (changed) onChange_();
   }
 }
 
-bool ScenarioWatch::concernsFile(const char* events, long length) const {
-  for (long offset = 0; offset < length;) {
-    const auto* event = reinterpret_cast<const struct inotify_event*>(events + offset);
-    if ((event->mask & IN_Q_OVERFLOW) != 0) return true;
-    if (event->len > 0 && name_ == event->name) return true;
-    offset += static_cast<long>(sizeof(struct inotify_event) + event->len);
+bool ScenarioWatch::drainEvents() {
+  alignas(struct inotify_event) char events[4096];
+  bool concerned = false;
+  for (;;) {
+    const ssize_t length = read(inotifyFd_, events, sizeof events);
+    if (length <= 0) return concerned;
+    for (ssize_t offset = 0; offset < length;) {
+      const auto* event = reinterpret_cast<const struct inotify_event*>(events + offset);
+      if ((event->mask & IN_Q_OVERFLOW) != 0 || (event->len > 0 && name_ == event->name)) {
+        apply(event->mask);
+        concerned = true;
+      }
+      offset += static_cast<ssize_t>(sizeof(struct inotify_event) + event->len);
+    }
   }
-  return false;
+}
+
+void ScenarioWatch::apply(uint32_t mask) {
+  if ((mask & IN_MODIFY) != 0) {
+    writing_ = true;
+    return;
+  }
+  // A close, a rename or a removal ends any write in place; so does a lost
+  // event, since nothing more can be known.
+  if ((mask & (IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_Q_OVERFLOW)) != 0) {
+    writing_ = false;
+  }
+  pending_ = true;
 }
 
 }  // namespace kopdmsim

@@ -1,12 +1,17 @@
 // Notices edits of the scenario file without costing the calls anything: a
 // thread sleeps on an inotify watch of the file's directory (editors often
 // replace a file by renaming a new one over it) and runs a callback when the
-// file was written, replaced, removed or touched.
+// file was replaced, removed or touched, or when a writer closed it. A file
+// being written in place is left alone from its first change until its
+// writer closes it, so the callback never sees it half-written; the callback
+// asks, after reading, whether the file was changed meanwhile and drops what
+// it read if so.
 //
 // Thread-safety: the callback runs on the watch's own thread.
 #ifndef KOPDM_CLIENTAPI_SCENARIO_WATCH_H_
 #define KOPDM_CLIENTAPI_SCENARIO_WATCH_H_
 
+#include <cstdint>
 #include <functional>
 #include <string>
 #include <thread>
@@ -15,7 +20,9 @@ namespace kopdmsim {
 
 class ScenarioWatch {
  public:
-  using OnChange = std::function<void()>;
+  // True when nothing has happened to the file since the callback began.
+  using StillSettled = std::function<bool()>;
+  using OnChange = std::function<void(const StillSettled&)>;
 
   ScenarioWatch(const std::string& path, OnChange onChange);
   ScenarioWatch(const ScenarioWatch&) = delete;
@@ -30,13 +37,19 @@ class ScenarioWatch {
 
  private:
   void run();
-  bool concernsFile(const char* events, long length) const;
+  // Reads every queued event; true when any concerned the file.
+  bool drainEvents();
+  void apply(uint32_t mask);
+
 
   std::string name_;
   OnChange onChange_;
   int inotifyFd_ = -1;
   int stopFd_ = -1;
   std::string problem_;
+  // Used by the watch's thread only.
+  bool writing_ = false;  // changed in place and not yet closed by its writer
+  bool pending_ = false;  // to be read again once settled
   std::thread thread_;
 };
 
