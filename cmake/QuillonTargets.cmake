@@ -34,12 +34,27 @@ function(quillon_benchmark name)
   target_link_libraries(${name} PRIVATE ${ARG_LIBS} quillon_warnings benchmark::benchmark)
 endfunction()
 
-# quillon_fuzzer(<name> SOURCES <files...> [LIBS <targets...>])
+# quillon_fuzzer(<name> SOURCES <files...> [LIBS <targets...>] [INCLUDES <dirs...>])
+# A libFuzzer target in the fuzz build. In the test build, the same sources
+# linked with a replay main instead: when fuzz/corpus/<folder>/ exists
+# (<folder> being the name of the target's folder under fuzz/), CTest replays
+# every input of it once, as <name>_replay.
 function(quillon_fuzzer name)
-  cmake_parse_arguments(ARG "" "" "SOURCES;LIBS" ${ARGN})
-  add_executable(${name} ${ARG_SOURCES})
-  target_link_libraries(${name} PRIVATE ${ARG_LIBS} quillon_warnings)
-  target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+  cmake_parse_arguments(ARG "" "" "SOURCES;LIBS;INCLUDES" ${ARGN})
+  get_filename_component(folder ${CMAKE_CURRENT_SOURCE_DIR} NAME)
+  set(corpus ${PROJECT_SOURCE_DIR}/fuzz/corpus/${folder})
+  if(QUILLON_BUILD_FUZZ)
+    add_executable(${name} ${ARG_SOURCES})
+    target_include_directories(${name} PRIVATE ${ARG_INCLUDES})
+    target_link_libraries(${name} PRIVATE ${ARG_LIBS} quillon_warnings)
+    target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+  elseif(QUILLON_BUILD_TESTS AND IS_DIRECTORY ${corpus})
+    add_executable(${name}_replay ${ARG_SOURCES} ${PROJECT_SOURCE_DIR}/fuzz/replay_main.cc)
+    target_include_directories(${name}_replay PRIVATE ${ARG_INCLUDES})
+    target_link_libraries(${name}_replay PRIVATE ${ARG_LIBS} quillon_warnings)
+    add_test(NAME ${name}_replay COMMAND ${name}_replay ${corpus})
+    set_tests_properties(${name}_replay PROPERTIES TIMEOUT 120)
+  endif()
 endfunction()
 
 # quillon_test_in_locales(<test>)
