@@ -16,8 +16,6 @@ namespace quillon::test_support {
 
 namespace {
 
-int connectTo(uint16_t port);
-
 [[noreturn]] void fail(const std::string& what) {
   throw std::runtime_error("http client: " + what);
 }
@@ -31,28 +29,33 @@ std::optional<std::string> findHeader(const HeaderList& headers, std::string_vie
   return std::nullopt;
 }
 
+int connectTo(uint16_t port) {
+  const int fd = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+  if (fd < 0) fail(std::string("socket: ") + std::strerror(errno));
+  sockaddr_in target{};
+  target.sin_family = AF_INET;
+  target.sin_port = htons(port);
+  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  if (::connect(fd, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
+    const std::string reason = std::strerror(errno);
+    ::close(fd);
+    fail("connect to port " + std::to_string(port) + ": " + reason);
+  }
+  return fd;
+}
+
 }  // namespace
 
 std::optional<std::string> HttpResponse::header(std::string_view name) const {
   return findHeader(headers, name);
 }
 
-HttpClient::HttpClient(uint16_t port) : fd_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-  if (fd_ < 0) fail(std::string("socket: ") + std::strerror(errno));
+HttpClient::HttpClient(uint16_t port) : fd_(connectTo(port)) {
   const timeval timeout{30, 0};
   ::setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
   ::setsockopt(fd_, SOL_SOCKET, SO_SNDTIMEO, &timeout, sizeof timeout);
   const int on = 1;
   ::setsockopt(fd_, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
-  sockaddr_in target{};
-  target.sin_family = AF_INET;
-  target.sin_port = htons(port);
-  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  if (::connect(fd_, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
-    const std::string reason = std::strerror(errno);
-    ::close(fd_);
-    fail("connect to port " + std::to_string(port) + ": " + reason);
-  }
 }
 
 HttpClient::~HttpClient() { ::close(fd_); }
@@ -135,25 +138,6 @@ HttpResponse httpRequest(uint16_t port, const std::string& method, const std::st
   HttpClient client(port);
   return client.send(HttpRequest{method, target, headers, body});
 }
-
-namespace {
-
-int connectTo(uint16_t port) {
-  const int fd = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-  if (fd < 0) fail(std::string("socket: ") + std::strerror(errno));
-  sockaddr_in target{};
-  target.sin_family = AF_INET;
-  target.sin_port = htons(port);
-  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  if (::connect(fd, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
-    const std::string reason = std::strerror(errno);
-    ::close(fd);
-    fail("connect to port " + std::to_string(port) + ": " + reason);
-  }
-  return fd;
-}
-
-}  // namespace
 
 RawConnection::RawConnection(uint16_t port) : fd_(connectTo(port)) {}
 
