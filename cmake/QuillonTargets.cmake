@@ -63,6 +63,7 @@ endfunction()
 # are compiled into the build tree, so the runs do not depend on what the
 # machine has installed.
 function(quillon_test_in_locales name)
+  # status_reader_test names this folder too.
   set(locale_dir ${CMAKE_BINARY_DIR}/test-locales)
   if(NOT TARGET quillon_test_locales)
     find_program(LOCALEDEF localedef REQUIRED)
