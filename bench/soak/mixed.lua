@@ -3,6 +3,12 @@
 local requests = {}
 local count = 0
 local limit = tonumber(os.getenv("REQUESTS") or "1000000")
+-- wrk itself stops only at the end of its duration: the script that runs it
+-- waits for this file and then interrupts it, which makes wrk print its
+-- summary.
+local finished = os.getenv("FINISHED_MARK")
+local unexpected = os.getenv("UNEXPECTED_LOG")
+local unexpectedCount = 0
 
 function init(args)
   local device = "/quillon/syncableDevices/pendulo/timekeeper/genericTk"
@@ -19,9 +25,26 @@ function request()
   return requests[turn]
 end
 
+-- Only the timescale that does not exist may fail (500 with its code in
+-- X-Status-Code); the first few other failures are kept for a look.
 function response(status, headers, body)
   count = count + 1
-  if count >= limit then wrk.thread:stop() end
+  if status ~= 200 and not (status == 500 and body:find("pendulo/tr9/00-00-00-FF-FE-00-00-00\\\"", 1, true)) then
+    unexpectedCount = unexpectedCount + 1
+    if unexpected and unexpectedCount <= 20 then
+      local file = io.open(unexpected, "a")
+      file:write(status, " ", body, "\n")
+      file:close()
+    end
+  end
+  if count == limit then
+    wrk.thread:stop()
+    if finished then
+      local file = io.open(finished, "w")
+      file:write(unexpectedCount, "\n")
+      file:close()
+    end
+  end
 end
 
 function done(summary, latency, requests)

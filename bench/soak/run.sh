@@ -59,11 +59,27 @@ sample start
 ) &
 replacer=$!
 
-REQUESTS=$requests wrk -t1 -c16 -d3600s -s bench/soak/mixed.lua --latency \
-  "http://127.0.0.1:$port" >"$scratch/wrk.log"
+started=$(date +%s.%N)
+REQUESTS=$requests FINISHED_MARK=$scratch/finished UNEXPECTED_LOG=$scratch/unexpected \
+  wrk -t1 -c16 -d3600s -s bench/soak/mixed.lua --latency "http://127.0.0.1:$port" \
+  >"$scratch/wrk.log" &
+client=$!
+while [ ! -e "$scratch/finished" ] && kill -0 "$client" 2>/dev/null; do sleep 0.2; done
+elapsed=$(echo "$(date +%s.%N) - $started" | bc)
+kill -INT "$client" 2>/dev/null || true
+wait "$client" || true
 wait "$replacer"
 sample end
-grep -E "requests in|Non-2xx|Socket errors|answers:" "$scratch/wrk.log"
+printf 'requests: %s in %.1f s\n' "$requests" "$elapsed"
+grep -E "Non-2xx|Socket errors|answers:" "$scratch/wrk.log" || true
+# A listing that spans a replacement which removes a time reference answers
+# that the reference does not exist; a half-read file would answer
+# "scenario unusable" (-1074100993) instead.
+echo "unexpected answers of the first $requests: $(cat "$scratch/finished" 2>/dev/null || echo '?')"
+if [ -s "$scratch/unexpected" ]; then
+  echo "of which unusable scenario: $(grep -c -- -1074100993 "$scratch/unexpected" || true) of the first 20 kept"
+  cut -c1-400 "$scratch/unexpected" | head -3
+fi
 # Every fourth request asks for a timescale that does not exist: 500 with
 # the error code in X-Status-Code, by design. Anything else is a fault.
 for kind in "/quillon/resources" "/quillon/syncableDevices/pendulo/timekeeper/genericTk" \
