@@ -25,7 +25,7 @@ constexpr int kListenBacklog = 1024;
 constexpr unsigned kIdleTimeoutSeconds = 60;
 // Per-connection memory for the request head, the daemon's record of each
 // header and the answer's headers. The query string is kept out of it (see
-// takeQuery), so a head of kMaxHeadBytes with up to about 200 headers fits.
+// onRequestLine), so a head of kMaxHeadBytes with up to about 200 headers fits.
 // The daemon clears this memory for every request, so a larger pool costs
 // throughput on every answer.
 constexpr size_t kConnectionMemory = 32 * 1024;
@@ -93,13 +93,12 @@ class HttpServer::Connection {
   std::string client;
   std::u32string clientWide;
   ConnectionTable::Entry entry;
-  // The request in progress: its head as taken before the daemon parsed the
-  // query, and what the host reads of its headers.
+  // The request in progress: its query as taken before the daemon would
+  // have split it, what the host reads of its headers, and its answer.
   std::string query;
   bool hasQuery = false;
   std::vector<RawParameter> parameters;
   RequestHead head;
-  // The request in progress.
   Clock::time_point started;
   bool bodyTooLarge = false;
   std::string body;
