@@ -12,9 +12,10 @@ namespace kopdmsim {
 namespace {
 
 // Writes in place are watched too (IN_MODIFY, truncation included), only to
-// know that the file is incomplete until its writer closes it.
-constexpr uint32_t kEvents =
-    IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB | IN_MODIFY;
+// know that the file is incomplete until its writer closes it; openings and
+// closings, to know whether anyone has it open.
+constexpr uint32_t kEvents = IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB |
+                             IN_MODIFY | IN_OPEN | IN_CLOSE_NOWRITE;
 
 std::string directoryOf(const std::string& path) {
   const std::size_t slash = path.rfind('/');
@@ -55,7 +56,8 @@ ScenarioWatch::~ScenarioWatch() {
 }
 
 void ScenarioWatch::run() {
-  const StillSettled stillSettled = [this] { return !drainEvents() && !writing_; };
+  const Settling settling{[this] { return !drainEvents() && !writing_ && !pending_; },
+                          [this] { return opened_ == 0; }};
   for (;;) {
     pollfd fds[2] = {{inotifyFd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
     if (poll(fds, 2, -1) < 0) {
@@ -68,39 +70,54 @@ void ScenarioWatch::run() {
     // now, so a dropped read is followed by another once the file settles.
     while (pending_ && !writing_) {
       pending_ = false;
-      onChange_(stillSettled);
+      onChange_(settling);
     }
   }
 }
 
 bool ScenarioWatch::drainEvents() {
   alignas(struct inotify_event) char events[4096];
-  bool concerned = false;
+  bool changed = false;
   for (;;) {
     const ssize_t length = read(inotifyFd_, events, sizeof events);
-    if (length <= 0) return concerned;
+    if (length <= 0) return changed;
     for (ssize_t offset = 0; offset < length;) {
       const auto* event = reinterpret_cast<const struct inotify_event*>(events + offset);
       if ((event->mask & IN_Q_OVERFLOW) != 0 || (event->len > 0 && name_ == event->name)) {
-        apply(event->mask);
-        concerned = true;
+        changed = apply(event->mask) || changed;
       }
       offset += static_cast<ssize_t>(sizeof(struct inotify_event) + event->len);
     }
   }
 }
 
-void ScenarioWatch::apply(uint32_t mask) {
+bool ScenarioWatch::apply(uint32_t mask) {
+  if ((mask & IN_OPEN) != 0) {
+    ++opened_;
+    return false;
+  }
+  if ((mask & IN_CLOSE_NOWRITE) != 0) {
+    // A close of an opening made before the watch began is not counted.
+    if (opened_ > 0) --opened_;
+    return false;
+  }
   if ((mask & IN_MODIFY) != 0) {
     writing_ = true;
-    return;
+    return true;
   }
-  // A close, a rename or a removal ends any write in place; so does a lost
-  // event, since nothing more can be known.
-  if ((mask & (IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_Q_OVERFLOW)) != 0) {
+  if ((mask & IN_CLOSE_WRITE) != 0) {
+    if (opened_ > 0) --opened_;
     writing_ = false;
   }
+  // A rename or a removal puts another file (or none) under the name, and a
+  // lost event leaves nothing known: whoever had the old one open no longer
+  // counts.
+  if ((mask & (IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_Q_OVERFLOW)) != 0) {
+    writing_ = false;
+    opened_ = 0;
+  }
   pending_ = true;
+  return true;
 }
 
 }  // namespace kopdmsim

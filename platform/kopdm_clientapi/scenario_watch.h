@@ -3,9 +3,12 @@
 // replace a file by renaming a new one over it) and runs a callback when the
 // file was replaced, removed or touched, or when a writer closed it. A file
 // being written in place is left alone from its first change until its
-// writer closes it, so the callback never sees it half-written; the callback
-// asks, after reading, whether the file was changed meanwhile and drops what
-// it read if so.
+// writer closes it, so the callback never sees it half-written. After
+// reading, the callback asks whether the file changed meanwhile, and whether
+// any program has it open: the kernel reports a writer's opening before its
+// truncation takes effect, but the truncation itself a moment after, so a
+// file read empty or cut short while someone has it open may be a write
+// just begun.
 //
 // Thread-safety: the callback runs on the watch's own thread.
 #ifndef KOPDM_CLIENTAPI_SCENARIO_WATCH_H_
@@ -20,9 +23,15 @@ namespace kopdmsim {
 
 class ScenarioWatch {
  public:
-  // True when nothing has happened to the file since the callback began.
-  using StillSettled = std::function<bool()>;
-  using OnChange = std::function<void(const StillSettled&)>;
+  // What the callback may ask after reading the file.
+  struct Settling {
+    // True when nothing changed the file since the callback began.
+    std::function<bool()> unchanged;
+    // True when no program has the file open (the callback's own reads,
+    // once closed, aside).
+    std::function<bool()> closedEverywhere;
+  };
+  using OnChange = std::function<void(const Settling&)>;
 
   ScenarioWatch(const std::string& path, OnChange onChange);
   ScenarioWatch(const ScenarioWatch&) = delete;
@@ -37,9 +46,10 @@ class ScenarioWatch {
 
  private:
   void run();
-  // Reads every queued event; true when any concerned the file.
+  // Reads every queued event; true when any changed the file.
   bool drainEvents();
-  void apply(uint32_t mask);
+  // Takes one event of the file into the flags; true when it changed it.
+  bool apply(uint32_t mask);
 
 
   std::string name_;
@@ -50,6 +60,7 @@ class ScenarioWatch {
   // Used by the watch's thread only.
   bool writing_ = false;  // changed in place and not yet closed by its writer
   bool pending_ = false;  // to be read again once settled
+  long opened_ = 0;       // openings of the file not yet closed
   std::thread thread_;
 };
 

@@ -18,9 +18,9 @@ namespace {
 
 constexpr const char* kFile = "kopdm_clientapi/timeService";
 constexpr const char* kChannel = "kopdmclientapi_debug";
-// How long a file that does not parse must stay unchanged before it is
-// served as broken.
-constexpr std::chrono::milliseconds kBrokenFileSettling{20};
+// How long a file that does not parse must stay as read before it is served
+// as unusable.
+constexpr std::chrono::milliseconds kBrokenFileSettling{50};
 // A scenario is a hand-written file; anything larger is a mistake.
 constexpr long kMaxScenarioBytes = 16L * 1024 * 1024;
 
@@ -83,9 +83,7 @@ TimeService::TimeService(std::string path) : path_(std::move(path)) {
   hasSnapshotKey_ = pthread_key_create(&snapshotKey_, nullptr) == 0;
   if (!path_.empty()) {
     watch_ = std::make_unique<ScenarioWatch>(
-        path_, [this](const ScenarioWatch::StillSettled& stillSettled) {
-          reloadIfSettled(stillSettled);
-        });
+        path_, [this](const ScenarioWatch::Settling& settling) { reloadIfSettled(settling); });
     pollFile_ = !watch_->active();
   }
   // Loaded after the watch exists, so an edit in between is not missed.
@@ -174,17 +172,22 @@ const TimeService::State& TimeService::current() const {
 
 void TimeService::reload() { publish(std::make_shared<const State>(loadState())); }
 
-void TimeService::reloadIfSettled(const ScenarioWatch::StillSettled& stillSettled) {
+void TimeService::reloadIfSettled(const ScenarioWatch::Settling& settling) {
   auto state = std::make_shared<const State>(loadState());
   // A writer that began between the two looks at the file may have been
   // read half-way: the watch reports again when it closes the file.
-  if (!(stampOf(path_) == state->stamp) || !stillSettled()) return;
+  if (!(stampOf(path_) == state->stamp) || !settling.unchanged()) return;
   if (!state->usable) {
-    // The kernel reports a truncation a moment after it happened, so an
-    // empty or cut file read in that moment looks settled. A broken file is
-    // served only once it has stayed as read for a while.
+    // A file read empty or cut short may be a write just begun whose
+    // truncation the kernel has yet to report: one that a program still
+    // has open, or that changes within a moment, is left to the report of
+    // its close.
+    if (!settling.closedEverywhere()) return;
     std::this_thread::sleep_for(kBrokenFileSettling);
-    if (!(stampOf(path_) == state->stamp) || !stillSettled()) return;
+    if (!(stampOf(path_) == state->stamp) || !settling.unchanged() ||
+        !settling.closedEverywhere()) {
+      return;
+    }
   }
   publish(std::move(state));
 }

@@ -92,7 +92,7 @@ class TimeService {
   State loadState() const;
   void reload();
   // Serves the file as it is now, unless it changed while being read.
-  void reloadIfSettled(const ScenarioWatch::StillSettled& stillSettled);
+  void reloadIfSettled(const ScenarioWatch::Settling& settling);
   void reloadIfFileChanged();
 
   // Reports the scenario problem or the service being down, if any.
