@@ -9,6 +9,7 @@ local limit = tonumber(os.getenv("REQUESTS") or "1000000")
 local finished = os.getenv("FINISHED_MARK")
 local unexpected = os.getenv("UNEXPECTED_LOG")
 local unexpectedCount = 0
+local unusableCount = 0
 
 function init(args)
   local device = "/quillon/syncableDevices/pendulo/timekeeper/genericTk"
@@ -31,6 +32,7 @@ function response(status, headers, body)
   count = count + 1
   if status ~= 200 and not (status == 500 and body:find("pendulo/tr9/00-00-00-FF-FE-00-00-00\\\"", 1, true)) then
     unexpectedCount = unexpectedCount + 1
+    if body:find("-1074100993", 1, true) then unusableCount = unusableCount + 1 end
     if unexpected and unexpectedCount <= 20 then
       local file = io.open(unexpected, "a")
       file:write(status, " ", body, "\n")
@@ -41,7 +43,8 @@ function response(status, headers, body)
     wrk.thread:stop()
     if finished then
       local file = io.open(finished, "w")
-      file:write(unexpectedCount, "\n")
+      file:write(unexpectedCount, " unexpected answers, ", unusableCount,
+                 " of them \"scenario unusable\"\n")
       file:close()
     end
   end
