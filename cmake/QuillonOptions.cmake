@@ -9,6 +9,13 @@ if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
   set(CMAKE_BUILD_TYPE RelWithDebInfo CACHE STRING "Build type" FORCE)
 endif()
 
+# GCC gives the static locals of inline library templates "unique" binding,
+# which makes the loader keep a library that has one mapped for good; the
+# platform libraries must unload with the plug-in that loaded them.
+if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+  add_compile_options($<$<COMPILE_LANGUAGE:CXX>:-fno-gnu-unique>)
+endif()
+
 if(QUILLON_SANITIZE)
   list(JOIN QUILLON_SANITIZE "," sanitizers)
   add_compile_options(-fsanitize=${sanitizers} -fno-omit-frame-pointer)

@@ -6,14 +6,22 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstring>
+#include <thread>
 
 namespace kopdmsim {
 namespace {
 
-// Plain writes show up once, at close, so a half-written file is never read.
-constexpr uint32_t kEvents =
-    IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB;
+// How long a file that does not read well must stay as read before it is
+// served as unusable.
+constexpr std::chrono::milliseconds kBrokenFileSettling{50};
+
+// Writes in place are watched too (IN_MODIFY, truncation included), only to
+// know that the file is incomplete until its writer closes it; openings and
+// closings, to know whether anyone has it open.
+constexpr uint32_t kEvents = IN_CLOSE_WRITE | IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_ATTRIB |
+                             IN_MODIFY | IN_OPEN | IN_CLOSE_NOWRITE;
 
 std::string directoryOf(const std::string& path) {
   const std::size_t slash = path.rfind('/');
@@ -27,6 +35,18 @@ std::string nameOf(const std::string& path) {
 }
 
 }  // namespace
+
+bool ScenarioWatch::Settling::keep(bool readWell,
+                                   const std::function<bool()>& sameAsRead) const {
+  if (!sameAsRead() || !unchanged()) return false;
+  if (readWell) return true;
+  // The kernel reports a truncation a moment after it happened: a file read
+  // empty or cut short that a program still has open, or that changes
+  // within a moment, is left to the report of its close.
+  if (!closedEverywhere()) return false;
+  std::this_thread::sleep_for(kBrokenFileSettling);
+  return sameAsRead() && unchanged() && closedEverywhere();
+}
 
 ScenarioWatch::ScenarioWatch(const std::string& path, OnChange onChange)
     : name_(nameOf(path)), onChange_(std::move(onChange)) {
@@ -54,7 +74,8 @@ ScenarioWatch::~ScenarioWatch() {
 }
 
 void ScenarioWatch::run() {
-  alignas(struct inotify_event) char events[4096];
+  const Settling settling{[this] { return !drainEvents() && !writing_ && !pending_; },
+                          [this] { return opened_ == 0; }};
   for (;;) {
     pollfd fds[2] = {{inotifyFd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
     if (poll(fds, 2, -1) < 0) {
@@ -62,24 +83,59 @@ void ScenarioWatch::run() {
       return;
     }
     if (fds[1].revents != 0) return;
-    bool changed = false;
-    for (;;) {
-      const ssize_t length = read(inotifyFd_, events, sizeof events);
-      if (length <= 0) break;
-      changed = changed || concernsFile(events, length);
+    drainEvents();
+    // What happened while the callback read the file is in the flags by
+    // now, so a dropped read is followed by another once the file settles.
+    while (pending_ && !writing_) {
+      pending_ = false;
+      onChange_(settling);
     }
-    if (changed) onChange_();
   }
 }
 
-bool ScenarioWatch::concernsFile(const char* events, long length) const {
-  for (long offset = 0; offset < length;) {
-    const auto* event = reinterpret_cast<const struct inotify_event*>(events + offset);
-    if ((event->mask & IN_Q_OVERFLOW) != 0) return true;
-    if (event->len > 0 && name_ == event->name) return true;
-    offset += static_cast<long>(sizeof(struct inotify_event) + event->len);
+bool ScenarioWatch::drainEvents() {
+  alignas(struct inotify_event) char events[4096];
+  bool changed = false;
+  for (;;) {
+    const ssize_t length = read(inotifyFd_, events, sizeof events);
+    if (length <= 0) return changed;
+    for (ssize_t offset = 0; offset < length;) {
+      const auto* event = reinterpret_cast<const struct inotify_event*>(events + offset);
+      if ((event->mask & IN_Q_OVERFLOW) != 0 || (event->len > 0 && name_ == event->name)) {
+        changed = apply(event->mask) || changed;
+      }
+      offset += static_cast<ssize_t>(sizeof(struct inotify_event) + event->len);
+    }
   }
-  return false;
+}
+
+bool ScenarioWatch::apply(uint32_t mask) {
+  if ((mask & IN_OPEN) != 0) {
+    ++opened_;
+    return false;
+  }
+  if ((mask & IN_CLOSE_NOWRITE) != 0) {
+    // A close of an opening made before the watch began is not counted.
+    if (opened_ > 0) --opened_;
+    return false;
+  }
+  if ((mask & IN_MODIFY) != 0) {
+    writing_ = true;
+    return true;
+  }
+  if ((mask & IN_CLOSE_WRITE) != 0) {
+    if (opened_ > 0) --opened_;
+    writing_ = false;
+  }
+  // A rename or a removal puts another file (or none) under the name, and a
+  // lost event leaves nothing known: whoever had the old one open no longer
+  // counts.
+  if ((mask & (IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_Q_OVERFLOW)) != 0) {
+    writing_ = false;
+    opened_ = 0;
+  }
+  pending_ = true;
+  return true;
 }
 
 }  // namespace kopdmsim

@@ -5,7 +5,9 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <chrono>
 #include <mutex>
+#include <thread>
 
 #include "default_scenario.h"
 #include "answer_text.h"
@@ -22,14 +24,13 @@ constexpr const char* kChannel = "kopdmclientapi_debug";
 // at the same address.
 std::atomic<uint64_t> nextGeneration{0};
 
-// The snapshot this thread last served, and its publication number.
-struct ThreadSnapshot {
-  uint64_t generation = 0;
-  std::shared_ptr<const void> state;
-};
-thread_local ThreadSnapshot threadSnapshot;
-
 }  // namespace
+
+// The snapshot one thread last served, and its publication number.
+struct TimeService::ThreadSnapshot {
+  uint64_t generation = 0;
+  std::shared_ptr<const State> state;
+};
 
 struct TimeService::Answer {
   const std::string* text;
@@ -43,15 +44,23 @@ bool TimeService::FileStamp::operator==(const FileStamp& other) const {
 }
 
 TimeService::TimeService(std::string path) : path_(std::move(path)) {
+  // A key without a destructor: the slots belong to this object, so nothing
+  // is left for thread exit to run and the library stays unloadable while
+  // its callers' threads live.
+  hasSnapshotKey_ = pthread_key_create(&snapshotKey_, nullptr) == 0;
   if (!path_.empty()) {
-    watch_ = std::make_unique<ScenarioWatch>(path_, [this] { reload(); });
+    watch_ = std::make_unique<ScenarioWatch>(
+        path_, [this](const ScenarioWatch::Settling& settling) { reloadIfSettled(settling); });
     pollFile_ = !watch_->active();
   }
   // Loaded after the watch exists, so an edit in between is not missed.
   publish(std::make_shared<const State>(loadState()));
 }
 
-TimeService::~TimeService() { watch_.reset(); }
+TimeService::~TimeService() {
+  watch_.reset();
+  if (hasSnapshotKey_) pthread_key_delete(snapshotKey_);
+}
 
 TimeService::FileStamp TimeService::stampOf(const std::string& path) {
   FileStamp stamp;
@@ -86,23 +95,57 @@ void TimeService::publish(std::shared_ptr<const State> state) {
 }
 
 void TimeService::publishLocked(std::shared_ptr<const State> state) {
+  // Without per-thread slots a served state must outlive every reader.
+  if (!hasSnapshotKey_) retained_.push_back(state);
   state_ = std::move(state);
   generation_.store(nextGeneration.fetch_add(1, std::memory_order_relaxed) + 1,
                     std::memory_order_release);
 }
 
-const TimeService::State& TimeService::current() const {
-  // The common case reads one shared word and writes nothing shared.
-  ThreadSnapshot& snapshot = threadSnapshot;
-  if (snapshot.generation != generation_.load(std::memory_order_acquire)) {
-    std::lock_guard<std::mutex> lock(mutex_);
-    snapshot.state = state_;
-    snapshot.generation = generation_.load(std::memory_order_relaxed);
+TimeService::ThreadSnapshot* TimeService::threadSnapshot() const {
+  if (!hasSnapshotKey_) return nullptr;
+  auto* snapshot = static_cast<ThreadSnapshot*>(pthread_getspecific(snapshotKey_));
+  if (snapshot != nullptr) return snapshot;
+  // A thread's first read: its slot stays with this object (a thread that
+  // ends leaves its slot behind until the service goes; pool threads are
+  // few and live long).
+  std::lock_guard<std::mutex> lock(mutex_);
+  snapshots_.push_back(std::make_unique<ThreadSnapshot>());
+  snapshot = snapshots_.back().get();
+  if (pthread_setspecific(snapshotKey_, snapshot) != 0) {
+    snapshots_.pop_back();
+    return nullptr;
   }
-  return *static_cast<const State*>(snapshot.state.get());
+  return snapshot;
+}
+
+const TimeService::State& TimeService::current() const {
+  ThreadSnapshot* snapshot = threadSnapshot();
+  if (snapshot == nullptr) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    if (!hasSnapshotKey_) return *state_;  // kept alive by retained_
+    // The slot could not be set: keep this state as long as the service.
+    retained_.push_back(state_);
+    return *state_;
+  }
+  // The common case reads one shared word and writes nothing shared.
+  if (snapshot->generation != generation_.load(std::memory_order_acquire)) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    snapshot->state = state_;
+    snapshot->generation = generation_.load(std::memory_order_relaxed);
+  }
+  return *snapshot->state;
 }
 
 void TimeService::reload() { publish(std::make_shared<const State>(loadState())); }
+
+void TimeService::reloadIfSettled(const ScenarioWatch::Settling& settling) {
+  auto state = std::make_shared<const State>(loadState());
+  // A writer that began between the two looks at the file may have been
+  // read half-way: the watch reports again when it closes the file.
+  if (!settling.keep(state->usable, [&] { return stampOf(path_) == state->stamp; })) return;
+  publish(std::move(state));
+}
 
 void TimeService::reloadIfFileChanged() {
   if (stampOf(path_) == current().stamp) return;

@@ -8,10 +8,13 @@
 // served state is an immutable snapshot; a reading call takes no lock while
 // its thread already holds the current one, so request threads do not
 // contend. The state-changing calls and reloads publish a new snapshot under
-// a mutex.
+// a mutex. The per-thread snapshots are slots of this object found through a
+// thread key, not thread-local objects, so that no thread-exit destructor
+// keeps the library mapped after it is unloaded.
 #ifndef KOPDM_CLIENTAPI_TIME_SERVICE_H_
 #define KOPDM_CLIENTAPI_TIME_SERVICE_H_
 
+#include <pthread.h>
 #include <sys/types.h>
 
 #include <atomic>
@@ -21,6 +24,7 @@
 #include <mutex>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "backend.h"
 #include "error_record/status.h"
@@ -75,15 +79,21 @@ class TimeService : public Backend {
   };
   // What a text call answers: the text, or null after an error was reported.
   struct Answer;
+  struct ThreadSnapshot;
 
   static FileStamp stampOf(const std::string& path);
   // The state being served, valid until this thread's next call into this
   // object.
   const State& current() const;
+  // The calling thread's slot, made on its first read; null when the
+  // system has no thread key to give.
+  ThreadSnapshot* threadSnapshot() const;
   void publish(std::shared_ptr<const State> state);
   void publishLocked(std::shared_ptr<const State> state);  // mutex_ held
   State loadState() const;
   void reload();
+  // Serves the file as it is now, unless it changed while being read.
+  void reloadIfSettled(const ScenarioWatch::Settling& settling);
   void reloadIfFileChanged();
 
   // Reports the scenario problem or the service being down, if any.
@@ -107,6 +117,11 @@ class TimeService : public Backend {
   mutable std::mutex mutex_;           // held to replace or to take a snapshot
   std::shared_ptr<const State> state_;  // guarded by mutex_
   std::atomic<uint64_t> generation_{0};  // of state_; unique in the process
+  pthread_key_t snapshotKey_{};
+  bool hasSnapshotKey_ = false;
+  mutable std::vector<std::unique_ptr<ThreadSnapshot>> snapshots_;  // guarded by mutex_
+  // Only when a thread has no slot: every state served, kept to the end.
+  mutable std::vector<std::shared_ptr<const State>> retained_;  // guarded by mutex_
   std::unique_ptr<ScenarioWatch> watch_;  // null for the built-in scenario
   bool pollFile_ = false;                  // the watch could not be set up
 };

@@ -3,6 +3,7 @@
 #include <cjson/cJSON.h>
 
 #include "error_record/error.h"
+#include "ko/dsc/ascii.h"
 
 namespace cJSONUtils {
 namespace {
@@ -32,7 +33,14 @@ std::string getString(const cJSON* node) {
 }
 
 cJSON* getObjectItem(const cJSON* object, const char* key) noexcept {
-  return cJSON_GetObjectItem(object, key);
+  // cJSON's own case-insensitive match folds with the process locale, where
+  // "I" need not fold to "i" (Turkish); keys are matched in ASCII instead,
+  // the first match winning as with cJSON.
+  if (object == nullptr || key == nullptr) return nullptr;
+  for (cJSON* child = object->child; child != nullptr; child = child->next) {
+    if (child->string != nullptr && ko::dsc::ascii::equalsIgnoringCase(child->string, key)) return child;
+  }
+  return nullptr;
 }
 
 }  // namespace cJSONUtils

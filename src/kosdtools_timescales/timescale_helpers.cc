@@ -241,11 +241,10 @@ std::vector<std::string> TimescaleHelpers::readStrings(const cJSON* list) {
 }
 
 std::string TimescaleHelpers::readTrAttr(const std::string& trId, const AttrRead& read) {
-  // Each listing reads several attributes of every TR; a per-thread buffer
-  // keeps its capacity across reads, so copying the answer in allocates
-  // nothing. Nothing called below reads an attribute again on this thread.
-  thread_local std::string answer;
-  answer.clear();
+  // A buffer of the call's own, not one kept per thread: a thread-local
+  // object with a destructor pins the plug-in in memory after the host
+  // unloads it, for as long as the reading thread lives.
+  std::string answer;
   try {
     client_->getTrAttrJson(trId, read.key, &answer);
   } catch (const koerr::ExceptionBase& caught) {

@@ -1,7 +1,5 @@
 #include "koxlator/errors_parser.h"
 
-#include <strings.h>
-
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -9,6 +7,7 @@
 
 #include "error_record/constants.h"
 #include "error_record/error.h"
+#include "ko/dsc/ascii.h"
 #include "kosysq/stdpath_util.h"
 #include "koxlator/directory.h"
 #include "koxlator/line_file.h"
@@ -38,7 +37,7 @@ constexpr Tag kCommentStart{"<kocomment>", 11};
 constexpr Tag kCommentEnd{"</kocomment>", 12};
 
 bool startsWith(const char* line, const Tag& tag) {
-  return strncasecmp(line, tag.text, tag.length) == 0;
+  return ko::dsc::ascii::equalsIgnoringCase(line, tag.text, tag.length);
 }
 
 // Only a line whose very first byte is NUL is an unidentified heading; every

@@ -23,6 +23,25 @@ std::string headOnly(int code, const char* constant, const char* file, int line)
          "\",\"line\":" + std::to_string(line) + ",\"component\":\"quillon\"}";
 }
 
+TEST(JsonLayer, KeysMatchInAnyAsciiCaseWhateverTheLocale) {
+  CppJson document("{\"timeReferenceId\":1,\"gmIdentity\":2,\"\u0130d\":3,\"id\":4,\"ID\":5}");
+  struct Case {
+    const char* key;
+    int value;  // 0: no member
+  } cases[] = {
+      {"TIMEREFERENCEID", 1}, {"GMidentity", 2}, {"\xc4\xb0" "d", 3}, {"iD", 4}, {"ID", 4},
+      {"\xc4\xb1" "d", 0},  // a dotless i is no "i", nor is the dotted capital
+      {"timeReferenceI", 0},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.key);
+    const cJSON* member = cJSONUtils::getObjectItem(document.get(), c.key);
+    EXPECT_EQ(member != nullptr ? member->valueint : 0, c.value);
+  }
+  EXPECT_EQ(cJSONUtils::getObjectItem(nullptr, "id"), nullptr);
+  EXPECT_EQ(cJSONUtils::getObjectItem(document.get(), nullptr), nullptr);
+}
+
 TEST(JsonLayer, TypeTestsCompareTheWholeTypeWord) {
   CppJson document("{\"s\":\"text\",\"a\":[1],\"n\":null,\"o\":{}}");
   const cJSON* s = cJSONUtils::getObjectItem(document.get(), "S");  // keys match in any case

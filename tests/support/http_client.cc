@@ -3,6 +3,7 @@
 #include <arpa/inet.h>
 #include <netinet/in.h>
 #include <netinet/tcp.h>
+#include <poll.h>
 #include <strings.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -30,28 +31,33 @@ std::optional<std::string> findHeader(const HeaderList& headers, std::string_vie
   return std::nullopt;
 }
 
+int connectTo(uint16_t port) {
+  const int fd = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+  if (fd < 0) fail(std::string("socket: ") + std::strerror(errno));
+  sockaddr_in target{};
+  target.sin_family = AF_INET;
+  target.sin_port = htons(port);
+  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  if (::connect(fd, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
+    const std::string reason = std::strerror(errno);
+    ::close(fd);
+    fail("connect to port " + std::to_string(port) + ": " + reason);
+  }
+  return fd;
+}
+
 }  // namespace
 
 std::optional<std::string> HttpResponse::header(std::string_view name) const {
   return findHeader(headers, name);
 }
 
-HttpClient::HttpClient(uint16_t port) : fd_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-  if (fd_ < 0) fail(std::string("socket: ") + std::strerror(errno));
+HttpClient::HttpClient(uint16_t port) : fd_(connectTo(port)) {
   const timeval timeout{30, 0};
   ::setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
   ::setsockopt(fd_, SOL_SOCKET, SO_SNDTIMEO, &timeout, sizeof timeout);
   const int on = 1;
   ::setsockopt(fd_, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
-  sockaddr_in target{};
-  target.sin_family = AF_INET;
-  target.sin_port = htons(port);
-  target.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  if (::connect(fd_, reinterpret_cast<sockaddr*>(&target), sizeof target) != 0) {
-    const std::string reason = std::strerror(errno);
-    ::close(fd_);
-    fail("connect to port " + std::to_string(port) + ": " + reason);
-  }
 }
 
 HttpClient::~HttpClient() { ::close(fd_); }
@@ -134,6 +140,38 @@ HttpResponse httpRequest(uint16_t port, const std::string& method, const std::st
                          const HeaderList& headers, const std::string& body) {
   HttpClient client(port);
   return client.send(HttpRequest{method, target, headers, body});
+}
+
+RawConnection::RawConnection(uint16_t port) : fd_(connectTo(port)) {}
+
+RawConnection::~RawConnection() { ::close(fd_); }
+
+bool RawConnection::send(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t sent = ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+    if (sent <= 0) return false;
+    bytes.remove_prefix(static_cast<size_t>(sent));
+  }
+  return true;
+}
+
+std::string RawConnection::receive(int timeoutMs) {
+  std::string out;
+  char chunk[16384];
+  pollfd wait{fd_, POLLIN, 0};
+  while (::poll(&wait, 1, timeoutMs) == 1) {
+    const ssize_t got = ::recv(fd_, chunk, sizeof chunk, 0);
+    if (got <= 0) break;
+    out.append(chunk, static_cast<size_t>(got));
+  }
+  return out;
+}
+
+bool RawConnection::closedByServer(int timeoutMs) {
+  char byte;
+  pollfd wait{fd_, POLLIN, 0};
+  if (::poll(&wait, 1, timeoutMs) != 1) return false;
+  return ::recv(fd_, &byte, 1, MSG_PEEK) <= 0;
 }
 
 }  // namespace quillon::test_support

@@ -53,6 +53,30 @@ class HttpClient {
   bool closed_ = false;
 };
 
+// A connection that sends bytes exactly as given, for heads the client above
+// cannot write (repeated or malformed headers, requests sent in pieces, idle
+// or trickling connections).
+class RawConnection {
+ public:
+  // Connects to 127.0.0.1:`port`; throws std::runtime_error on failure.
+  explicit RawConnection(uint16_t port);
+  ~RawConnection();
+  RawConnection(const RawConnection&) = delete;
+  RawConnection& operator=(const RawConnection&) = delete;
+
+  // False when the server has closed or reset the connection.
+  bool send(std::string_view bytes);
+  // What arrives until the server closes the connection or `timeoutMs`
+  // passes, whichever is first.
+  std::string receive(int timeoutMs);
+  // Whether the server has closed the connection (reads its end, waiting up
+  // to `timeoutMs`).
+  bool closedByServer(int timeoutMs);
+
+ private:
+  int fd_;
+};
+
 // One request on a fresh connection.
 HttpResponse httpRequest(uint16_t port, const std::string& method, const std::string& target,
                          const HeaderList& headers = {}, const std::string& body = "");

@@ -89,9 +89,10 @@ const char* nameOr(const char* name, const char* fallback) {
 
 LiveTimeService::LiveTimeService(std::string configPath, std::string clientDirectory)
     : path_(std::move(configPath)), clientDirectory_(std::move(clientDirectory)) {
-  watch_ = std::make_unique<kopdmsim::ScenarioWatch>(path_, [this] { reload(); });
+  watch_ = std::make_unique<kopdmsim::ScenarioWatch>(
+      path_, [this](const kopdmsim::ScenarioWatch::Settling& settling) { reload(&settling); });
   // Loaded after the watch exists, so an edit in between is not missed.
-  reload();
+  reload(nullptr);
 }
 
 LiveTimeService::~LiveTimeService() { watch_.reset(); }
@@ -110,8 +111,11 @@ std::shared_ptr<const LiveTimeService::State> LiveTimeService::loadState() const
   return state;
 }
 
-void LiveTimeService::reload() {
+void LiveTimeService::reload(const kopdmsim::ScenarioWatch::Settling* settling) {
   std::shared_ptr<const State> loaded = loadState();
+  // A file that changed while it was read may be half-written: the watch
+  // reports again once its writer is done.
+  if (settling != nullptr && !settling->keep(loaded->usable, [] { return true; })) return;
   std::lock_guard<std::mutex> lock(mutex_);
   state_ = std::move(loaded);
 }

@@ -66,7 +66,9 @@ class LiveTimeService : public kopdmsim::Backend {
 
   std::shared_ptr<const State> loadState() const;
   std::shared_ptr<const State> current() const;
-  void reload();
+  // Reads the configuration again; with `settling`, keeps what it read only
+  // when the watch says the file was read whole.
+  void reload(const kopdmsim::ScenarioWatch::Settling* settling);
 
   DaemonLink* findLink(const State& state, std::string_view trId) const;
   // The selected time reference's link, or null when none is selected.

@@ -4,7 +4,6 @@
 #include <fcntl.h>
 #include <netinet/in.h>
 #include <sys/socket.h>
-#include <strings.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -12,6 +11,7 @@
 #include <string_view>
 #include <vector>
 
+#include "request_head.h"
 #include "url_mapping.h"
 #include "ws_runtime/exchange.h"
 
@@ -23,10 +23,15 @@ using Clock = std::chrono::steady_clock;
 
 constexpr int kListenBacklog = 1024;
 constexpr unsigned kIdleTimeoutSeconds = 60;
-// Per-connection memory for the request head and the answer's headers; heads
-// of up to about 7 KiB fit. The daemon clears this memory for every request,
-// so a larger pool costs throughput on every answer.
-constexpr size_t kConnectionMemory = 8 * 1024;
+// Per-connection memory for the request head, the daemon's record of each
+// header and the answer's headers. The query string is kept out of it (see
+// onRequestLine), so a head of kMaxHeadBytes with up to about 200 headers fits.
+// The daemon clears this memory for every request, so a larger pool costs
+// throughput on every answer.
+constexpr size_t kConnectionMemory = 32 * 1024;
+// The largest request head served: request line, query included, and
+// headers with their line ends.
+constexpr size_t kMaxHeadBytes = 16 * 1024;
 // Buffers that grew past this for one large request are given back afterwards.
 constexpr size_t kKeptBufferBytes = 64 * 1024;
 
@@ -34,6 +39,13 @@ constexpr std::string_view kNotFound = "Not Found\n";
 constexpr std::string_view kBadRequest = "Bad Request: malformed escape or invalid UTF-8 in URL\n";
 constexpr std::string_view kTooLarge = "Payload Too Large\n";
 constexpr std::string_view kUnavailable = "Service Unavailable\n";
+constexpr std::string_view kHeadTooLarge = "Request Header Fields Too Large\n";
+constexpr std::string_view kConflictingLength =
+    "Bad Request: conflicting Content-Length headers\n";
+constexpr std::string_view kLengthWithChunked =
+    "Bad Request: Content-Length together with Transfer-Encoding\n";
+constexpr std::string_view kConflictingContentType =
+    "Bad Request: conflicting Content-Type headers\n";
 
 std::string numericAddress(const sockaddr* address) {
   char text[INET6_ADDRSTRLEN] = "";
@@ -51,52 +63,14 @@ std::string numericAddress(const sockaddr* address) {
 // is decoded and "%2F" can stand inside a variable.
 size_t keepEscapes(void*, MHD_Connection*, char* text) { return std::strlen(text); }
 
-// What the plug-in may read of a request's head besides its path.
-struct RequestHead {
-  std::vector<RawParameter> query;
-  const char* contentType = nullptr;
-  const char* accept = nullptr;
-
-  void clear() {
-    query.clear();
-    contentType = nullptr;
-    accept = nullptr;
-  }
-};
-
-// One walk over everything the daemon parsed; of two headers with one name
-// the first counts, as with the daemon's own look-up.
-MHD_Result collectHead(void* into, MHD_ValueKind kind, const char* key, const char* value) {
-  auto& head = *static_cast<RequestHead*>(into);
-  if (kind == MHD_GET_ARGUMENT_KIND) {
-    head.query.push_back(RawParameter{key, value != nullptr ? value : ""});
-    return MHD_YES;
-  }
-  // The first letter settles most headers (Host, User-Agent, ...) without a
-  // whole comparison.
-  switch (key[0] | 0x20) {
-    case 'c':
-      if (head.contentType == nullptr && strcasecmp(key, MHD_HTTP_HEADER_CONTENT_TYPE) == 0) {
-        head.contentType = value;
-      }
-      break;
-    case 'a':
-      if (head.accept == nullptr && strcasecmp(key, MHD_HTTP_HEADER_ACCEPT) == 0) {
-        head.accept = value;
-      }
-      break;
-  }
+// One walk over the headers the daemon parsed, in the order received.
+MHD_Result collectHeader(void* into, MHD_ValueKind, const char* key, const char* value) {
+  auto& collected = *static_cast<std::pair<RequestHead*, size_t>*>(into);
+  const std::string_view name(key);
+  const std::string_view text(value != nullptr ? value : "");
+  collected.first->add(name, text);
+  collected.second += name.size() + text.size() + 4;  // ": " and the line end
   return MHD_YES;
-}
-
-// Keeps the query list's storage for the thread's next request.
-const RequestHead& readHead(MHD_Connection* connection) {
-  thread_local RequestHead head;
-  head.clear();
-  MHD_get_connection_values(connection,
-                            static_cast<MHD_ValueKind>(MHD_HEADER_KIND | MHD_GET_ARGUMENT_KIND),
-                            &collectHead, &head);
-  return head;
 }
 
 // Each pool thread runs one request at a time, so it keeps one exchange for
@@ -118,7 +92,13 @@ class HttpServer::Connection {
  public:
   std::string client;
   std::u32string clientWide;
-  // The request in progress.
+  ConnectionTable::Entry entry;
+  // The request in progress: its query as taken before the daemon would
+  // have split it, what the host reads of its headers, and its answer.
+  std::string query;
+  bool hasQuery = false;
+  std::vector<RawParameter> parameters;
+  RequestHead head;
   Clock::time_point started;
   bool bodyTooLarge = false;
   std::string body;
@@ -136,6 +116,8 @@ class HttpServer::Connection {
   }
 
   void finish() {
+    hasQuery = false;
+    query.clear();
     bodyTooLarge = false;
     shrinkIfLarge(body);
     shrinkIfLarge(output);
@@ -207,6 +189,8 @@ bool HttpServer::start(std::string& error) {
       {MHD_OPTION_NOTIFY_COMPLETED, reinterpret_cast<intptr_t>(&onRequestDone), this},
       {MHD_OPTION_NOTIFY_CONNECTION, reinterpret_cast<intptr_t>(&onConnection), this},
       {MHD_OPTION_UNESCAPE_CALLBACK, reinterpret_cast<intptr_t>(&keepEscapes), nullptr},
+      {MHD_OPTION_URI_LOG_CALLBACK, reinterpret_cast<intptr_t>(&onRequestLine), this},
+      {MHD_OPTION_CONNECTION_LIMIT, options_.maxConnections, nullptr},
       {MHD_OPTION_CONNECTION_TIMEOUT, kIdleTimeoutSeconds, nullptr},
       {MHD_OPTION_CONNECTION_MEMORY_LIMIT, kConnectionMemory, nullptr},
   };
@@ -263,16 +247,43 @@ void HttpServer::onRequestDone(void* self, MHD_Connection*, void** requestContex
   *requestContext = nullptr;
 }
 
-void HttpServer::onConnection(void*, MHD_Connection*, void** socketContext,
+void HttpServer::onConnection(void* self, MHD_Connection* connection, void** socketContext,
                               MHD_ConnectionNotificationCode event) {
+  ConnectionTable& table = static_cast<HttpServer*>(self)->connections_;
   if (event == MHD_CONNECTION_NOTIFY_CLOSED) {
-    delete static_cast<Connection*>(*socketContext);
+    auto* state = static_cast<Connection*>(*socketContext);
+    if (state != nullptr) table.remove(state->entry);
+    delete state;
     *socketContext = nullptr;
     return;
   }
   // Only the allocation happens here, inside the daemon's accept loop; the
   // address is written out when the connection's first request needs it.
-  *socketContext = new (std::nothrow) Connection();
+  auto* state = new (std::nothrow) Connection();
+  *socketContext = state;
+  const MHD_ConnectionInfo* info =
+      MHD_get_connection_info(connection, MHD_CONNECTION_INFO_CONNECTION_FD);
+  if (state != nullptr && info != nullptr) table.add(state->entry, info->connect_fd);
+}
+
+void* HttpServer::onRequestLine(void*, const char* uri, MHD_Connection* connection) {
+  // The daemon would next split the query into records in the connection's
+  // small memory, one record per parameter, so a long query of short
+  // parameters would not fit and its 431 would never leave. The query is
+  // taken here instead, and the daemon is left an empty one: it splits the
+  // query only after this call, at the '?' found before it. The request line
+  // lies in the connection's read buffer, which is writable.
+  const char* mark = std::strchr(uri, '?');
+  if (mark == nullptr) return nullptr;
+  const MHD_ConnectionInfo* info =
+      MHD_get_connection_info(connection, MHD_CONNECTION_INFO_SOCKET_CONTEXT);
+  auto* state = info != nullptr ? static_cast<Connection*>(info->socket_context) : nullptr;
+  if (state != nullptr) {
+    state->query.assign(mark + 1);
+    state->hasQuery = true;
+  }
+  const_cast<char*>(mark)[1] = '\0';
+  return nullptr;  // the request context stays empty until the head is complete
 }
 
 MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const char* method,
@@ -286,6 +297,7 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     state = info != nullptr ? static_cast<Connection*>(info->socket_context) : nullptr;
     if (state == nullptr) return MHD_NO;
     if (state->client.empty()) state->setClient(connection);
+    state->entry.busy();
     if (log_.enabled()) {
       state->started = Clock::now();
       state->method = method;
@@ -293,7 +305,7 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     }
     inFlight_.enter();
     *requestContext = state;
-    return MHD_YES;
+    return checkHead(connection, *state, url, method);
   }
   if (*uploadSize != 0) {
     // The body is read off to its end even when it is too large, so the 413
@@ -312,12 +324,50 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
   return respond(connection, *state, url, method);
 }
 
+MHD_Result HttpServer::checkHead(MHD_Connection* connection, Connection& state, const char* url,
+                                 const char* method) {
+  // A request whose head was complete before a stop began is served; one
+  // completed after it is not.
+  if (stopping_) return sendText(connection, state, MHD_HTTP_SERVICE_UNAVAILABLE, kUnavailable, true);
+  state.head.clear();
+  std::pair<RequestHead*, size_t> collected{&state.head, 0};
+  MHD_get_connection_values(connection, MHD_HEADER_KIND, &collectHeader, &collected);
+  // The request line: method, target and "HTTP/1.1" with spaces and line end.
+  const size_t headBytes = collected.second + std::strlen(method) + std::strlen(url) +
+                           (state.hasQuery ? state.query.size() + 1 : 0) + 12;
+  if (headBytes > kMaxHeadBytes) {
+    return sendText(connection, state, MHD_HTTP_REQUEST_HEADER_FIELDS_TOO_LARGE, kHeadTooLarge, true);
+  }
+  switch (state.head.verdict()) {
+    case HeadVerdict::kAccepted:
+      break;
+    case HeadVerdict::kConflictingLength:
+      return sendText(connection, state, MHD_HTTP_BAD_REQUEST, kConflictingLength, true);
+    case HeadVerdict::kLengthWithChunked:
+      return sendText(connection, state, MHD_HTTP_BAD_REQUEST, kLengthWithChunked, true);
+    case HeadVerdict::kConflictingContentType:
+      return sendText(connection, state, MHD_HTTP_BAD_REQUEST, kConflictingContentType, true);
+  }
+  // Answered before the daemon says "100 Continue", so the body is never
+  // sent. Without the expectation the body is read off instead (below), so
+  // that the connection stays usable.
+  uint64_t declared = 0;
+  if (state.head.expectsContinue() && state.head.declaredLength(declared) &&
+      declared > options_.maxBody) {
+    return sendText(connection, state, MHD_HTTP_CONTENT_TOO_LARGE, kTooLarge, true);
+  }
+  return MHD_YES;
+}
+
 MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, const char* url,
                                const char* method) {
-  if (stopping_) return sendText(connection, state, MHD_HTTP_SERVICE_UNAVAILABLE, kUnavailable, true);
   if (state.bodyTooLarge) return sendText(connection, state, MHD_HTTP_CONTENT_TOO_LARGE, kTooLarge);
 
-  const RequestHead& head = readHead(connection);
+  if (state.hasQuery) {
+    splitQuery(state.query, state.parameters);
+  } else {
+    state.parameters.clear();
+  }
   ws::runtime::Exchange& exchange = threadExchange();
   // A fresh identifier and empty buffers on every way out, so an identifier
   // kept by a plug-in past its Run is refused from then on.
@@ -326,7 +376,7 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
     ~Renew() { exchange.reset(); }
   } renew{exchange};
   ws::runtime::ExchangeRequest& request = exchange.request();
-  switch (mapUrl(options_.service, url, head.query, request)) {
+  switch (mapUrl(options_.service, url, state.parameters, request)) {
     case Mapping::kNotFound:
       return sendText(connection, state, MHD_HTTP_NOT_FOUND, kNotFound);
     case Mapping::kBadRequest:
@@ -334,8 +384,8 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
     case Mapping::kMapped:
       break;
   }
-  if (head.contentType != nullptr) request.setContentType(head.contentType);
-  if (head.accept != nullptr) request.setAccept(head.accept);
+  if (const std::string_view* type = state.head.contentType()) request.setContentType(*type);
+  if (const std::string_view* accept = state.head.accept()) request.setAccept(*accept);
   return runPlugin(connection, state, method, exchange);
 }
 
@@ -366,6 +416,7 @@ void HttpServer::requestDone(Connection& state) {
                     .count());
   }
   state.finish();
+  state.entry.waiting();
   inFlight_.leave();
 }
 

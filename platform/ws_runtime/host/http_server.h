@@ -15,6 +15,7 @@
 #include <microhttpd.h>
 
 #include "access_log.h"
+#include "connection_table.h"
 #include "in_flight.h"
 #include "options.h"
 #include "plugin.h"
@@ -25,7 +26,10 @@ namespace ws::host {
 class HttpServer {
  public:
   HttpServer(const Options& options, const Plugin& plugin, const AccessLog& log)
-      : options_(options), plugin_(plugin), log_(log) {}
+      : options_(options),
+        plugin_(plugin),
+        log_(log),
+        connections_(highMark(options.maxConnections), lowMark(options.maxConnections)) {}
   ~HttpServer();
   HttpServer(const HttpServer&) = delete;
   HttpServer& operator=(const HttpServer&) = delete;
@@ -44,9 +48,18 @@ class HttpServer {
 
   class Connection;  // per-connection state, reused across keep-alive requests
 
+  // Eviction of connections waiting for a head starts above 15/16 of the
+  // limit and makes room down to 7/8, so that the daemon always has room
+  // to accept the next client.
+  static size_t highMark(unsigned limit) { return limit - limit / 16; }
+  static size_t lowMark(unsigned limit) { return limit - limit / 8; }
+
  private:
   MHD_Result answer(MHD_Connection* connection, const char* url, const char* method,
                     const char* uploadData, size_t* uploadSize, void** requestContext);
+  // On the head's completion: refuses what must not reach the plug-in.
+  MHD_Result checkHead(MHD_Connection* connection, Connection& state, const char* url,
+                       const char* method);
   MHD_Result respond(MHD_Connection* connection, Connection& state, const char* url,
                      const char* method);
   MHD_Result runPlugin(MHD_Connection* connection, Connection& state, const char* method,
@@ -58,6 +71,7 @@ class HttpServer {
                               size_t* uploadSize, void** requestContext);
   static void onRequestDone(void* self, MHD_Connection* connection, void** requestContext,
                             MHD_RequestTerminationCode reason);
+  static void* onRequestLine(void* self, const char* uri, MHD_Connection* connection);
   static void onConnection(void* self, MHD_Connection* connection, void** socketContext,
                            MHD_ConnectionNotificationCode event);
 
@@ -67,6 +81,7 @@ class HttpServer {
   MHD_Daemon* daemon_ = nullptr;
   std::atomic<bool> stopping_{false};
   InFlight inFlight_;
+  ConnectionTable connections_;
 };
 
 }  // namespace ws::host

@@ -1,8 +1,9 @@
-// ws-runtime: serves one plug-in over HTTP until SIGINT or SIGTERM.
+// ws-runtime: serves one plug-in over HTTP until SIGINT, SIGTERM or SIGQUIT
+// (signals.h says what the others mean to it).
 //
 // Exit status: 0 after a clean stop, 1 when the plug-in cannot be loaded,
 // 2 on a command-line error, 3 when the address cannot be served.
-#include <signal.h>
+#include <sys/resource.h>
 
 #include <chrono>
 #include <cstdio>
@@ -14,6 +15,7 @@
 #include "http_server.h"
 #include "options.h"
 #include "plugin.h"
+#include "signals.h"
 
 namespace {
 
@@ -25,23 +27,60 @@ constexpr std::chrono::seconds kStopGrace{10};
 
 void say(const std::string& line) { std::fprintf(stderr, "ws-runtime: %s\n", line.c_str()); }
 
-// Blocks the stop signals in every thread (the daemon's threads inherit the
-// mask) so that only the main thread's sigwait() receives them.
-sigset_t blockStopSignals() {
-  sigset_t set;
-  sigemptyset(&set);
-  sigaddset(&set, SIGINT);
-  sigaddset(&set, SIGTERM);
-  pthread_sigmask(SIG_BLOCK, &set, nullptr);
-  signal(SIGPIPE, SIG_IGN);
-  return set;
+// Every connection takes a descriptor; the rest of the process needs a few.
+constexpr rlim_t kSpareDescriptors = 64;
+
+// Raises the descriptor limit so that the connection limit can be reached;
+// when the system does not allow that many, the connection limit comes
+// down instead.
+void fitDescriptorLimit(ws::host::Options& options) {
+  rlimit limit{};
+  if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return;
+  const rlim_t wanted = options.maxConnections + kSpareDescriptors;
+  if (limit.rlim_cur < wanted) {
+    limit.rlim_cur = limit.rlim_max == RLIM_INFINITY || limit.rlim_max >= wanted ? wanted
+                                                                                : limit.rlim_max;
+    setrlimit(RLIMIT_NOFILE, &limit);
+    getrlimit(RLIMIT_NOFILE, &limit);
+  }
+  if (limit.rlim_cur < wanted) {
+    const rlim_t fits = limit.rlim_cur > 2 * kSpareDescriptors ? limit.rlim_cur - kSpareDescriptors
+                                                               : kSpareDescriptors;
+    say("at most " + std::to_string(fits) + " connections: the descriptor limit is " +
+        std::to_string(limit.rlim_cur));
+    options.maxConnections = static_cast<unsigned>(fits);
+  }
+}
+
+// Answers signals until one asks for a stop; returns its name.
+std::string serveSignals(const ws::host::HostSignals& signals, ws::host::AccessLog& log) {
+  for (;;) {
+    const int number = signals.next();
+    const std::string name = ws::host::HostSignals::name(number);
+    switch (ws::host::HostSignals::meaning(number)) {
+      case ws::host::SignalMeaning::kStop:
+        return name;
+      case ws::host::SignalMeaning::kReopenLog: {
+        std::string error;
+        if (log.reopen(error)) {
+          say("access log reopened on " + name);
+        } else {
+          say(error);
+        }
+        break;
+      }
+      case ws::host::SignalMeaning::kIgnore:
+        say("ignoring " + name);
+        break;
+    }
+  }
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
   std::string error;
-  const auto options = ws::host::parseOptions(std::vector<std::string>(argv + 1, argv + argc), error);
+  auto options = ws::host::parseOptions(std::vector<std::string>(argv + 1, argv + argc), error);
   if (!options) {
     say(error);
     std::fputs(ws::host::usage().c_str(), stderr);
@@ -51,7 +90,13 @@ int main(int argc, char** argv) {
     std::fputs(ws::host::usage().c_str(), stdout);
     return 0;
   }
-  const sigset_t stopSignals = blockStopSignals();
+  const ws::host::HostSignals signals = ws::host::HostSignals::block();
+  fitDescriptorLimit(*options);
+  ws::host::AccessLog log(!options->quiet);
+  if (!options->accessLog.empty() && !options->quiet && !log.openFile(options->accessLog, error)) {
+    say(error);
+    return kExitUsage;
+  }
 
   std::unique_ptr<ws::host::Plugin> plugin =
       ws::host::Plugin::load(options->pluginPath, options->service, error);
@@ -61,7 +106,6 @@ int main(int argc, char** argv) {
   }
   plugin->init();
 
-  const ws::host::AccessLog log(!options->quiet);
   int status = 0;
   {
     ws::host::HttpServer server(*options, *plugin, log);
@@ -72,10 +116,9 @@ int main(int argc, char** argv) {
       say("listening on " + options->listen.substr(0, options->listen.rfind(':') + 1) +
           std::to_string(server.port()) + " (service /" + options->service + ", plug-in " +
           options->pluginPath + ", " + std::to_string(options->threads) + " threads)");
-      int signalNumber = 0;
-      sigwait(&stopSignals, &signalNumber);
+      const std::string stopSignal = serveSignals(signals, log);
       server.beginStop();
-      say(std::string("stopping on ") + (signalNumber == SIGINT ? "SIGINT" : "SIGTERM"));
+      say("stopping on " + stopSignal);
       server.finishStop(kStopGrace);
     }
   }

@@ -15,6 +15,8 @@ namespace ws::host {
 namespace {
 
 constexpr unsigned kMaxThreads = 256;
+constexpr uint64_t kMinConnections = 16;
+constexpr uint64_t kMaxConnections = 1000000;
 
 // A default that starts with "$ORIGIN/" lies relative to the folder of the
 // running host, so that one binary finds its plug-in in the build tree and
@@ -52,7 +54,8 @@ bool validServiceName(const std::string& name) {
 
 std::string usage() {
   return "usage: ws-runtime [--listen ADDR:PORT] [--plugin PATH] [--service NAME]\n"
-         "                  [--threads N] [--max-body BYTES] [--quiet]\n"
+         "                  [--threads N] [--max-body BYTES] [--max-connections N]\n"
+         "                  [--access-log PATH] [--quiet]\n"
          "  --listen    numeric address and port, e.g. 127.0.0.1:8080 or [::1]:8080;\n"
          "              port 0 picks a free one (default 127.0.0.1:8080)\n"
          "  --plugin    the plug-in library (default " + defaultPluginPath() + ")\n"
@@ -60,6 +63,8 @@ std::string usage() {
          "  --threads   request threads, 1.." + std::to_string(kMaxThreads) +
          " (default: one per processor)\n"
          "  --max-body  largest request body accepted, in bytes (default 1048576)\n"
+         "  --max-connections  open connections at most (default 10000)\n"
+         "  --access-log  append the access log to PATH, reopened on SIGHUP (default stderr)\n"
          "  --quiet     no access log\n";
 }
 
@@ -96,7 +101,7 @@ std::optional<Options> parseOptions(const std::vector<std::string>& args, std::s
       continue;
     }
     if (flag != "--listen" && flag != "--plugin" && flag != "--service" && flag != "--threads" &&
-        flag != "--max-body") {
+        flag != "--max-body" && flag != "--max-connections" && flag != "--access-log") {
       error = "unknown argument '" + flag + "'";
       return std::nullopt;
     }
@@ -126,6 +131,19 @@ std::optional<Options> parseOptions(const std::vector<std::string>& args, std::s
         return std::nullopt;
       }
       options.threads = static_cast<unsigned>(number);
+    } else if (flag == "--max-connections") {
+      if (!parseUnsigned(value, number) || number < kMinConnections || number > kMaxConnections) {
+        error = "--max-connections '" + value + "': a number from " +
+                std::to_string(kMinConnections) + " to " + std::to_string(kMaxConnections);
+        return std::nullopt;
+      }
+      options.maxConnections = static_cast<unsigned>(number);
+    } else if (flag == "--access-log") {
+      if (value.empty()) {
+        error = "--access-log needs a path";
+        return std::nullopt;
+      }
+      options.accessLog = value;
     } else {
       if (!parseUnsigned(value, number)) {
         error = "--max-body '" + value + "': a number of bytes";

@@ -21,6 +21,8 @@ struct Options {
   std::string service = "quillon";
   unsigned threads = 0;        // defaults to the number of processors
   uint64_t maxBody = 1024 * 1024;
+  unsigned maxConnections = 10000;
+  std::string accessLog;       // empty: stderr
   bool quiet = false;
   bool help = false;
 };

@@ -1,5 +1,6 @@
 #include "url_mapping.h"
 
+#include <algorithm>
 #include <array>
 
 namespace ws::host {
@@ -111,6 +112,26 @@ bool utf8Decode(std::string_view text, std::u32string& out) {
     i += extra + 1;
   }
   return true;
+}
+
+void splitQuery(std::string& query, std::vector<RawParameter>& out) {
+  out.clear();
+  std::replace(query.begin(), query.end(), '+', ' ');
+  const std::string_view text(query);
+  size_t start = 0;
+  while (start < text.size()) {
+    const size_t amp = text.find('&', start);
+    const size_t end = amp == std::string_view::npos ? text.size() : amp;
+    const std::string_view piece = text.substr(start, end - start);
+    const size_t equals = piece.find('=');
+    if (equals == std::string_view::npos) {
+      out.push_back(RawParameter{piece, {}});
+    } else {
+      out.push_back(RawParameter{piece.substr(0, equals), piece.substr(equals + 1)});
+    }
+    if (amp == std::string_view::npos) break;
+    start = amp + 1;
+  }
 }
 
 Mapping mapUrl(std::string_view service, std::string_view rawPath,

@@ -34,6 +34,14 @@ struct RawParameter {
   std::string_view value;
 };
 
+// Splits a raw query as the HTTP daemon would: at each '&', then at the
+// first '='; '+' stands for a space and becomes one here, before any
+// percent-decoding. A piece without '=' has an empty value; an empty piece
+// between two '&' is a parameter with an empty name; a last empty piece
+// (a query ending in '&') is nothing. `query` is rewritten in place and the
+// parameters point into it. `out` is cleared first.
+void splitQuery(std::string& query, std::vector<RawParameter>& out);
+
 // Fills `request`'s path, command and variables from the raw (undecoded)
 // path and query. `request` is written only when the result is kMapped.
 Mapping mapUrl(std::string_view service, std::string_view rawPath,
