@@ -42,3 +42,10 @@ measure() {  # url connections pid
   read -r rps p99 failed <<< "$result"
   echo "$rps $p99 $busiest $failed"
 }
+
+# One mean ratio line of two targets' rates, summed over the rounds in the
+# caller's associative array `sum` ("<target>-<connections>" keys).
+ratio() {  # connections label numerator denominator
+  awk -v c="$1" -v l="$2" -v h="${sum[$3-$1]}" -v n="${sum[$4-$1]}" \
+    'BEGIN { printf "ratio -c%-3s %-26s = %.2f\n", c, l, h / n }'
+}

@@ -73,6 +73,5 @@ for round in $(seq 1 "$rounds"); do
 done
 echo
 for conns in 16 64; do
-  awk -v c="$conns" -v l="${sum[live-$conns]}" -v s="${sum[simulated-$conns]}" \
-    'BEGIN { printf "ratio -c%-3s live/simulated = %.2f\n", c, l / s }'
+  ratio "$conns" "live/simulated" live simulated
 done

@@ -118,12 +118,8 @@ for round in $(seq 1 "$rounds"); do
 done
 echo
 for conns in 16 64; do
-  ratio() {  # label numerator denominator
-    awk -v l="$1" -v c="$conns" -v h="${sum[$2-$conns]}" -v n="${sum[$3-$conns]}" \
-      'BEGIN { printf "ratio -c%-3s %-26s = %.2f\n", c, l, h / n }'
-  }
-  ratio "immediate host/nginx" immediate nginx-immediate
-  ratio "immediate host/bare" immediate bare
-  ratio "bare/nginx" bare nginx-immediate
-  ratio "quillon host/nginx" quillon nginx-quillon
+  ratio "$conns" "immediate host/nginx" immediate nginx-immediate
+  ratio "$conns" "immediate host/bare" immediate bare
+  ratio "$conns" "bare/nginx" bare nginx-immediate
+  ratio "$conns" "quillon host/nginx" quillon nginx-quillon
 done
