@@ -138,23 +138,6 @@ TEST(UdsClient, BrokenAnswersEndAsMalformedAndSilenceAsTimeOut) {
   EXPECT_FALSE(gets[1].answered);
 }
 
-TEST(UdsClient, ProbingEndsWithTheFirstAnswer) {
-  Scene scene;
-  std::vector<PendingGet> gets{get(ManagementId::kDefaultDataSet, 0),
-                               get(ManagementId::kDefaultDataSet, 1)};
-  auto outcome = scene.start(gets, Until::kAnyAnswer);
-  auto requests = scene.requests(2);
-  ASSERT_EQ(requests.size(), 2u);
-  EXPECT_EQ(requests[1].first.transportSpecific, 1);
-  const Bytes answer =
-      managementAnswer(requests[1].first, quillon::test_support::defaultDataSet(1));
-  scene.daemon.sendTo(scene.client->path(), answer);
-  const ExchangeOutcome result = outcome.get();
-  EXPECT_FALSE(result.timedOut);
-  EXPECT_FALSE(gets[0].answered);
-  EXPECT_TRUE(gets[1].answered);
-}
-
 TEST(UdsClient, DaemonsAwayOrNotReadingFailTheSendAtOnce) {
   Scene scene;
   std::vector<PendingGet> one{get(ManagementId::kDefaultDataSet)};

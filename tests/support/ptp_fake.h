@@ -92,9 +92,10 @@ class FakeDaemon {
   std::thread thread_;
 };
 
-// A script that answers like a healthy one-port ordinary clock in
-// `portState` with transportSpecific `transport` (other requests stay
-// unanswered, as a daemon ignores them).
+// A script that answers like a healthy clock of `numberPorts` ports in
+// `portState` with transportSpecific `transport`: requests with another
+// transportSpecific stay unanswered, as a daemon ignores them, and unknown
+// management ids get NO_SUCH_ID.
 FakeDaemon::Script healthyDaemon(uint8_t portState, uint8_t transport = 0,
                                  uint16_t numberPorts = 1, int64_t masterOffset = -42);
 
