@@ -1,6 +1,6 @@
 // Text pieces shared by the simulated and the live time service: reading
 // their configuration file, the one-member JSON objects that attribute calls
-// answer, the copy of an answer into the caller's buffer, and the order of
+// answer, the copy of an answer into the caller's buffer, and the orders of
 // their tables of names.
 //
 // Thread-safety: pure functions.
@@ -28,6 +28,17 @@ struct ShortTextLess {
       if (x != y) return x < y;
     }
     return a.size() < b.size();
+  }
+};
+
+// An order for tables that are searched but never listed: by length, then
+// bytes. Most steps of a lookup among short names decide on the length
+// alone.
+struct LookupLess {
+  using is_transparent = void;
+  bool operator()(std::string_view a, std::string_view b) const noexcept {
+    if (a.size() != b.size()) return a.size() < b.size();
+    return ShortTextLess()(a, b);
   }
 };
 

@@ -26,13 +26,13 @@ enum class Call {
 const char* callName(Call call);
 
 // Attribute key -> its answer {"<key>":<value>}.
-using AnswerMap = std::map<std::string, std::string, ShortTextLess>;
+using AnswerMap = std::map<std::string, std::string, LookupLess>;
 
 struct TimeReference {
   AnswerMap attrAnswers;
   std::string metadataAnswer;
 };
-using TimeReferences = std::map<std::string, TimeReference, ShortTextLess>;
+using TimeReferences = std::map<std::string, TimeReference, LookupLess>;
 
 struct Fault {
   Call call = Call::kGetApiVersion;

@@ -7,17 +7,21 @@
 
 namespace {
 
-// The simulator lists TRs and attributes in its maps' order, so the inline
-// comparison must order exactly as the strings themselves do.
-TEST(ShortTextLess, OrdersAsStringsDo) {
+// The live service lists its attribute table in the table's order, so the
+// inline comparison must order exactly as the strings themselves do; the
+// lookup order need only tell exactly the equal strings apart.
+TEST(ShortTextLess, OrdersAsStringsDoAndLookupLessFindsEqualStrings) {
   const std::string texts[] = {"",    "a",   "A",         "tr0", "tr1", "tr10", "tr 1",
                                "tr",  "\xE9", "\x7F",     "b",   "ab",  "type", "portState",
                                "gmClockId", std::string("a\0b", 3), std::string("a\0", 2)};
   const kopdmsim::ShortTextLess less;
+  const kopdmsim::LookupLess lookupLess;
   for (const std::string& a : texts) {
     for (const std::string& b : texts) {
       SCOPED_TRACE(testing::PrintToString(a) + " < " + testing::PrintToString(b));
       EXPECT_EQ(less(a, b), a < b);
+      EXPECT_EQ(!lookupLess(a, b) && !lookupLess(b, a), a == b);
+      EXPECT_FALSE(lookupLess(a, b) && lookupLess(b, a));
     }
   }
 }

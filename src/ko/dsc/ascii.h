@@ -17,10 +17,15 @@ constexpr char lower(char c) noexcept {
 
 // Both NUL-terminated; true when they are equal but for ASCII case.
 inline bool equalsIgnoringCase(const char* a, const char* b) noexcept {
-  for (; *a != '\0' && *b != '\0'; ++a, ++b) {
-    if (lower(*a) != lower(*b)) return false;
+  // Keys mostly arrive in the case they are asked for: equal bytes skip the
+  // folding, and a NUL facing a letter fails the folded test.
+  for (;; ++a, ++b) {
+    if (*a == *b) {
+      if (*a == '\0') return true;
+    } else if (lower(*a) != lower(*b)) {
+      return false;
+    }
   }
-  return *a == *b;
 }
 
 // strncasecmp(text, word, length) == 0 in the "C" locale: the first `length`
