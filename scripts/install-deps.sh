@@ -6,7 +6,7 @@ set -euo pipefail
 packages=(
   cmake ninja-build g++ pkg-config make locales
   libgtest-dev libgmock-dev libbenchmark-dev
-  libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
+  libcjson-dev libjansson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
   linuxptp iproute2
   python3 python3-jsonschema python3-yaml
 )

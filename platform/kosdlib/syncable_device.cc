@@ -1,10 +1,11 @@
 // The device core shared by every device plug-in: a URI fixed at creation and
 // a requirements text guarded by a mutex, so concurrent readers always see a
-// whole document.
-#include <cJSON.h>
-
+// whole document. Accepted requirements reach the state file before the call
+// returns, so a client told "stored" is never told otherwise after a crash.
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <mutex>
 #include <new>
 #include <string>
@@ -12,6 +13,8 @@
 #include "error_record/error.h"
 #include "error_record/json_text.h"
 #include "kosdlib/kosdlib.h"
+#include "src/requirements.h"
+#include "src/requirements_store.h"
 
 namespace {
 
@@ -30,14 +33,15 @@ void reportMemoryFull(kosdlib_Status* status, int32_t line, const char* function
       .open(kChannel).add("message", "Out of memory.").add("function", function).close();
 }
 
-// The bound that the stored requirements set, or 0 when they set none.
-int64_t requiredMaxOffset(const std::string& requirements) {
-  if (requirements.empty()) return 0;
-  cJSON* root = cJSON_Parse(requirements.c_str());
-  const cJSON* bound = cJSON_GetObjectItemCaseSensitive(root, "maxOffsetNanos");
-  const int64_t value = cJSON_IsNumber(bound) ? static_cast<int64_t>(bound->valuedouble) : 0;
-  cJSON_Delete(root);
-  return value;
+void reportNotSaved(kosdlib_Status* status, int32_t line, const kosdlib::FileFailure& failure) {
+  koerr::Report(*status, koerr::koapalerr_osFault, kFile, line)
+      .open(kChannel)
+      .add("message",
+           "The coherency requirements cannot be saved; the previous ones stay in force.")
+      .add("stateFile", failure.file)
+      .add("systemCall", failure.call)
+      .add("systemError", std::strerror(failure.error))
+      .close();
 }
 
 // The device's distance from its timescale, when it is known.
@@ -46,15 +50,17 @@ struct Offset {
   int64_t nanos;
 };
 
-// A bound of 0 or less sets no limit; an offset nobody knows meets none.
-bool withinBound(const Offset& offset, int64_t bound) {
+// No bound sets no limit; an offset nobody knows meets none.
+bool withinBound(const Offset& offset, bool bounded, int64_t bound) {
   if (!offset.known) return false;
-  if (bound <= 0) return true;
+  if (!bounded) return true;
   // The magnitude as unsigned, so that the most negative offset has one too.
   const uint64_t magnitude = offset.nanos < 0 ? 0 - static_cast<uint64_t>(offset.nanos)
                                               : static_cast<uint64_t>(offset.nanos);
   return magnitude <= static_cast<uint64_t>(bound);
 }
+
+void logToHost(const std::string& line) { std::fprintf(stderr, "%s\n", line.c_str()); }
 
 }  // namespace
 
@@ -62,7 +68,9 @@ struct kosdlib_SyncableDevice {
   std::string uri;
   std::string kind;
   std::mutex mutex;
-  std::string requirements;  // minified JSON object, "" when none
+  kosdlib::Requirements requirements;  // text "" when none
+  std::mutex saveMutex;  // held across a save and the swap that follows it
+  std::unique_ptr<kosdlib::RequirementsStore> store;  // null: nothing is kept
   kosdlib_OffsetSource offsetSource = nullptr;  // null: the simulated clock
   void* offsetContext = nullptr;
 };
@@ -97,10 +105,21 @@ kosdlib_SyncableDeviceHandle kosdlib_SyncableDevice_create(const char* uri, cons
     return nullptr;
   }
   try {
-    auto* device = new kosdlib_SyncableDevice;
+    std::unique_ptr<kosdlib_SyncableDevice> device(new kosdlib_SyncableDevice);
     device->uri = uri;
     device->kind = kind;
-    return device;
+    const std::string directory = kosdlib::stateDirectoryFromEnvironment();
+    if (!directory.empty()) {
+      std::string problem;
+      device->store = kosdlib::RequirementsStore::open(
+          std::make_shared<kosdlib::PosixFileSystem>(), directory, uri, &problem);
+      if (!device->store) {
+        reportInvalid(status, __LINE__, problem.c_str());
+        return nullptr;
+      }
+      if (auto stored = device->store->load(logToHost)) device->requirements = std::move(*stored);
+    }
+    return device.release();
   } catch (const std::bad_alloc&) {
     reportMemoryFull(status, __LINE__, "kosdlib_SyncableDevice_create");
     return nullptr;
@@ -120,29 +139,24 @@ void kosdlib_SyncableDevice_setCoherencyRequirements(kosdlib_SyncableDeviceHandl
   if (requirements == nullptr) {
     return reportInvalid(status, __LINE__, "The coherency requirements are missing.");
   }
-  // Trailing text after the object counts as malformed, not as ignorable.
-  const char* end = nullptr;
-  cJSON* root = cJSON_ParseWithOpts(requirements, &end, 1);
-  const bool parsed = root != nullptr;
-  const bool isObject = cJSON_IsObject(root);
-  cJSON_Delete(root);
-  if (!parsed) {
-    koerr::Report(*status, koerr::koapalerr_invalidParameter, kFile, __LINE__)
-        .open(kChannel)
-        .add("message", "The coherency requirements are not valid JSON.")
-        .addUInt("errorOffset", end ? static_cast<uint32_t>(end - requirements) : 0u)
-        .close();
-    return;
-  }
-  if (!isObject) {
-    return reportInvalid(status, __LINE__, "The coherency requirements must be a JSON object.");
-  }
   try {
-    std::string minified(requirements);
-    cJSON_Minify(&minified[0]);
-    minified.resize(std::strlen(minified.c_str()));
+    kosdlib::Requirements accepted;
+    kosdlib::RequirementsProblem problem;
+    if (!kosdlib::parseRequirements(requirements, &accepted, &problem)) {
+      koerr::Report(*status, koerr::koapalerr_invalidParameter, kFile, __LINE__)
+          .open(kChannel)
+          .add("message", problem.message)
+          .addUInt("errorOffset", static_cast<uint32_t>(problem.offset))
+          .close();
+      return;
+    }
+    std::lock_guard<std::mutex> saving(device->saveMutex);
+    kosdlib::FileFailure failure;
+    if (device->store && !device->store->save(&accepted, &failure)) {
+      return reportNotSaved(status, __LINE__, failure);
+    }
     std::lock_guard<std::mutex> lock(device->mutex);
-    device->requirements.swap(minified);
+    std::swap(device->requirements, accepted);
   } catch (const std::bad_alloc&) {
     reportMemoryFull(status, __LINE__, "kosdlib_SyncableDevice_setCoherencyRequirements");
   }
@@ -153,9 +167,18 @@ void kosdlib_SyncableDevice_clearCoherencyRequirements(kosdlib_SyncableDeviceHan
                                                        kosdlib_Status* status) {
   if (status == nullptr) return;
   if (device == nullptr) return reportInvalid(status, __LINE__, "The device handle is null.");
-  std::string dropped;
-  std::lock_guard<std::mutex> lock(device->mutex);
-  device->requirements.swap(dropped);
+  try {
+    std::lock_guard<std::mutex> saving(device->saveMutex);
+    kosdlib::FileFailure failure;
+    if (device->store && !device->store->save(nullptr, &failure)) {
+      return reportNotSaved(status, __LINE__, failure);
+    }
+    kosdlib::Requirements dropped;
+    std::lock_guard<std::mutex> lock(device->mutex);
+    std::swap(device->requirements, dropped);
+  } catch (const std::bad_alloc&) {
+    reportMemoryFull(status, __LINE__, "kosdlib_SyncableDevice_clearCoherencyRequirements");
+  }
 }
 
 int32_t kosdlib_SyncableDevice_isCoherent(kosdlib_SyncableDeviceHandle device,
@@ -166,9 +189,10 @@ int32_t kosdlib_SyncableDevice_isCoherent(kosdlib_SyncableDeviceHandle device,
     return -1;
   }
   const Offset offset = currentOffset(device);
-  if (maxOffsetNanos > 0) return withinBound(offset, maxOffsetNanos) ? 1 : 0;
+  if (maxOffsetNanos > 0) return withinBound(offset, true, maxOffsetNanos) ? 1 : 0;
   std::lock_guard<std::mutex> lock(device->mutex);
-  return withinBound(offset, requiredMaxOffset(device->requirements)) ? 1 : 0;
+  const kosdlib::Requirements& stored = device->requirements;
+  return withinBound(offset, stored.bounded, stored.maxOffsetNanos) ? 1 : 0;
 }
 
 void kosdlib_SyncableDevice_setOffsetSource(kosdlib_SyncableDeviceHandle device,
@@ -207,8 +231,9 @@ char* kosdlib_SyncableDevice_toJson(kosdlib_SyncableDeviceHandle device, kosdlib
     bool coherent;
     {
       std::lock_guard<std::mutex> lock(device->mutex);
-      text += device->requirements.empty() ? "null" : device->requirements;
-      coherent = withinBound(offset, requiredMaxOffset(device->requirements));
+      const kosdlib::Requirements& stored = device->requirements;
+      text += stored.text.empty() ? "null" : stored.text;
+      coherent = withinBound(offset, stored.bounded, stored.maxOffsetNanos);
     }
     text += ",\"plugin\":\"";
     koerr::appendJsonEscaped(text, device->kind);

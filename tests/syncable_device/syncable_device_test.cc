@@ -25,16 +25,18 @@ std::string document(const std::string& requirements, bool coherent) {
          ",\"offsetNanos\":250}";
 }
 
-// "code constant: message" of the record `call` raises.
+// "code constant: message @offset" of the record `call` raises.
 std::string failure(const std::function<void()>& call) {
   const auto raised = quillon::test_support::raisedBy(call);
   cJSON* root = cJSON_Parse(raised.record.c_str());
   const cJSON* debug = cJSON_GetObjectItemCaseSensitive(root, "kosdlib_debug");
   const cJSON* message = cJSON_GetObjectItemCaseSensitive(debug, "message");
+  const cJSON* offset = cJSON_GetObjectItemCaseSensitive(debug, "errorOffset");
   const cJSON* constant = cJSON_GetObjectItemCaseSensitive(root, "error_constant");
   std::string out = std::to_string(raised.code) + " " +
                     (cJSON_IsString(constant) ? constant->valuestring : "?") + ": " +
                     (cJSON_IsString(message) ? message->valuestring : "?");
+  if (cJSON_IsNumber(offset)) out += " @" + std::to_string(offset->valueint);
   cJSON_Delete(root);
   return out;
 }
@@ -51,25 +53,73 @@ TEST(SyncableDevice, RequirementsShapeTheDocumentUntilCleared) {
   EXPECT_EQ(device.toJson(), document("null", true));
 }
 
-// One row per refusal of the library; the old requirements stay.
-TEST(SyncableDevice, BadRequirementsAndUrisFailWithTheLibraryRecord) {
+// One row per refusal; the old requirements stay in force.
+TEST(SyncableDevice, RequirementsAreOneStrictObjectWithAnIntegerBound) {
   SyncableDeviceActual device(kUri);
   device.setCoherencyRequirements("{\"maxOffsetNanos\":100}", "");
+  const std::string bound =
+      "The coherency requirements' \"maxOffsetNanos\" must be an integer from 0 to "
+      "9223372036854775807.";
+  const std::string json = "The coherency requirements are not valid JSON: ";
   struct Case {
     const char* text;
-    const char* message;
+    std::string message;
+    int offset;
   } cases[] = {
-      {"{\"a\":1} {}", "The coherency requirements are not valid JSON."},
-      {"null", "The coherency requirements must be a JSON object."},
+      {"{\"a\":1} {}", json + "end of file expected.", 9},
+      {"", json + "unexpected token.", 0},
+      {"null", "The coherency requirements must be a JSON object.", 0},
+      {" [1]", "The coherency requirements must be a JSON object.", 1},
+      {"\xEF\xBB\xBF{}", "The coherency requirements begin with a byte-order mark.", 0},
+      {"{\"a\":\"x\x01y\"}", json + "control character 0x1.", 7},
+      {"{\"a\":\"\xff\"}", json + "unable to decode byte 0xff.", 6},
+      {"{\"a\":\"\xc0\x80\"}", json + "unable to decode byte 0xc0.", 6},
+      {"{\"b\":[{\"c\":1,\"c\":2}]}", json + "duplicate object key.", 16},
+      {"{\"maxOffsetNanos\":9223372036854775808}", json + "too big integer.", 37},
+      {"{\"maxOffsetNanos\":1e999}", json + "real number overflow.", 23},
+      {"{\"maxOffsetNanos\":-1}", bound, 18},
+      {"{\"maxOffsetNanos\":null}", bound, 18},
+      {"{\"maxOffsetNanos\":\"1\"}", bound, 18},
+      {"{\"maxOffsetNanos\":[1]}", bound, 18},
+      {"{\"maxOffsetNanos\":1.5}", bound, 18},
+      {"{\"maxOffsetNanos\":1e-999}", bound, 18},
+      {"{\"maxOffsetNanos\":1.0}", bound, 18},
+      // Nested members and strings do not count; escaped names do.
+      {"{\"a\":{\"maxOffsetNanos\":1},\"s\":\"\\\",\\\"maxOffsetNanos\\\":\", \"max\\u004FffsetNanos\" :\t-5}",
+       bound, 80},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.text);
     EXPECT_EQ(failure([&] { device.setCoherencyRequirements(c.text, ""); }),
-              std::string("-52005 koapalerr_invalidParameter: ") + c.message);
+              "-52005 koapalerr_invalidParameter: " + c.message + " @" + std::to_string(c.offset));
     EXPECT_EQ(device.toJson(), document("{\"maxOffsetNanos\":100}", false));
   }
   EXPECT_EQ(failure([] { SyncableDeviceActual unnamed(""); }),
             "-52005 koapalerr_invalidParameter: The device URI is missing or empty.");
+}
+
+// The bounds at both ends of the range, and text that is valid however odd.
+TEST(SyncableDevice, BoundsAtTheEdgesAreKept) {
+  SyncableDeviceActual device(kUri);
+  const struct {
+    const char* text;
+    const char* stored;
+    bool coherent;
+  } cases[] = {
+      {"{\"maxOffsetNanos\":0}", "{\"maxOffsetNanos\":0}", false},
+      {"{\"maxOffsetNanos\":-0}", "{\"maxOffsetNanos\":-0}", false},
+      {"{\"maxOffsetNanos\":250}", "{\"maxOffsetNanos\":250}", true},
+      {"{\"maxOffsetNanos\":249}", "{\"maxOffsetNanos\":249}", false},
+      {"{\"maxOffsetNanos\":9223372036854775807}", "{\"maxOffsetNanos\":9223372036854775807}",
+       true},
+      {"{ \"n\" : \"\\u0000 \\u00e9\" , \"maxOffsetNanos\" : 7 }",
+       "{\"n\":\"\\u0000 \\u00e9\",\"maxOffsetNanos\":7}", false},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.text);
+    device.setCoherencyRequirements(c.text, "");
+    EXPECT_EQ(device.toJson(), document(c.stored, c.coherent));
+  }
 }
 
 // What a live time service tells the time keeper: an offset, or nothing.
