@@ -4,15 +4,15 @@
 #             them, the documentation: all a target with the real platform
 #             libraries needs;
 #   platform  the stand-ins of those libraries, the ws-runtime host, its
-#             service unit and defaults, the example scenarios: what a
-#             development or demo machine adds.
+#             service unit and defaults, the example scenarios: what any
+#             Debian machine adds to serve the plug-in, simulated or live.
 # Included after every unit, so that units need no install rules of their own.
 # The plug-in looks for its texts through this marker at a fixed path, outside
 # any prefix.
 set(QUILLON_MARKER_DIR /etc/korvane/share)
 set(QUILLON_SHARE_DIR ${CMAKE_INSTALL_DATADIR}/korvane)
-set(QUILLON_FULL_SHARE_DIR ${CMAKE_INSTALL_FULL_DATADIR}/korvane)
-set(QUILLON_UNIT_DIR ${CMAKE_INSTALL_PREFIX}/lib/systemd/system)
+set(QUILLON_UNIT_SUBDIR lib/systemd/system)
+set(QUILLON_UNIT_DIR ${CMAKE_INSTALL_PREFIX}/${QUILLON_UNIT_SUBDIR})
 set(QUILLON_DEFAULTS_FILE /etc/default/ws-runtime)
 
 # Installed programs and libraries find each other relative to themselves
@@ -51,17 +51,39 @@ install(TARGETS ws-runtime RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT
 
 install(DIRECTORY ${PROJECT_SOURCE_DIR}/data/share/errors
         DESTINATION ${QUILLON_SHARE_DIR} COMPONENT plugin)
-file(CONFIGURE OUTPUT ${PROJECT_BINARY_DIR}/install/share.dir
-     CONTENT "${QUILLON_FULL_SHARE_DIR}\n")
+
+# quillon_install_path(<variable> <directory>)
+# The install script's code that sets <variable> to <directory> (relative to
+# the prefix, or absolute) under the prefix given at install time, which
+# `cmake --install --prefix` and CPack may change after configuring.
+function(quillon_install_path variable directory)
+  if(IS_ABSOLUTE "${directory}")
+    set(code "set(${variable} \"${directory}\")\n")
+  else()
+    set(code "set(${variable} \"\${CMAKE_INSTALL_PREFIX}/${directory}\")\n")
+  endif()
+  set(${variable}_CODE "${code}" PARENT_SCOPE)
+endfunction()
+
+# The marker and the unit name installed paths, so they are written when the
+# prefix is final: at install time.
+quillon_install_path(QUILLON_FULL_SHARE_DIR ${QUILLON_SHARE_DIR})
+install(CODE "${QUILLON_FULL_SHARE_DIR_CODE}
+  file(WRITE \"${PROJECT_BINARY_DIR}/install/share.dir\" \"\${QUILLON_FULL_SHARE_DIR}\\n\")"
+  COMPONENT plugin)
 install(FILES ${PROJECT_BINARY_DIR}/install/share.dir
         DESTINATION ${QUILLON_MARKER_DIR} COMPONENT plugin)
 install(FILES ${PROJECT_SOURCE_DIR}/README.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT plugin)
 install(DIRECTORY ${PROJECT_SOURCE_DIR}/docs/ DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT plugin)
 
-configure_file(${PROJECT_SOURCE_DIR}/packaging/ws-runtime.service.in
-               ${PROJECT_BINARY_DIR}/install/ws-runtime.service @ONLY)
+quillon_install_path(CMAKE_INSTALL_FULL_BINDIR ${CMAKE_INSTALL_BINDIR})
+quillon_install_path(CMAKE_INSTALL_FULL_DOCDIR ${CMAKE_INSTALL_DOCDIR})
+install(CODE "${CMAKE_INSTALL_FULL_BINDIR_CODE}${CMAKE_INSTALL_FULL_DOCDIR_CODE}
+  configure_file(\"${PROJECT_SOURCE_DIR}/packaging/ws-runtime.service.in\"
+                 \"${PROJECT_BINARY_DIR}/install/ws-runtime.service\" @ONLY)"
+  COMPONENT platform)
 install(FILES ${PROJECT_BINARY_DIR}/install/ws-runtime.service
-        DESTINATION ${QUILLON_UNIT_DIR} COMPONENT platform)
+        DESTINATION ${QUILLON_UNIT_SUBDIR} COMPONENT platform)
 install(FILES ${PROJECT_SOURCE_DIR}/packaging/ws-runtime.default
         DESTINATION /etc/default RENAME ws-runtime COMPONENT platform)
 install(DIRECTORY ${PROJECT_SOURCE_DIR}/examples/scenarios

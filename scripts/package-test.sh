@@ -43,7 +43,7 @@ dpkg --root="$root" --list 'quillon*' | tail -n 2
   --bindir /usr/bin --unit /usr/lib/systemd/system/ws-runtime.service \
   --explanations "$root_dir/data/share/errors/English/quillon.txt"
 
-in_scratch_etc dpkg --root="$root" --force-script-chrootless --purge quillon-demo-platform quillon
+in_scratch_etc dpkg --root="$root" --force-script-chrootless --purge quillon-platform quillon
 left=$(find "$root" -mindepth 1 -not -path "$root/var/lib/dpkg*" -not -type d)
 if [ -n "$left" ]; then
   echo "package-test: left behind after purge:" >&2

@@ -15,4 +15,10 @@ fi
 marker="$root/$build/share.dir"
 printf '%s\n' "$root/data/share" > "$marker"
 export KOSYSQ_SHARE_DIR_FILE="$marker"
+# The device's coherency requirements outlive a restart here too, in the
+# build folder, unless the caller names another place (docs/device.md).
+if [ -z "${KOSDLIB_STATE_DIRECTORY+set}" ]; then
+  export KOSDLIB_STATE_DIRECTORY="$root/$build/state"
+  mkdir -p "$KOSDLIB_STATE_DIRECTORY"
+fi
 exec "$host" --listen "$listen"

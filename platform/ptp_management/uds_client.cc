@@ -110,10 +110,33 @@ bool satisfied(const std::vector<PendingGet>& gets, Until until) {
 
 }  // namespace
 
+namespace {
+
+// Room for "/kopdm.<pid>.<n>" in a socket path of 107 bytes.
+bool fitsSocketPaths(const std::string& directory) {
+  return !directory.empty() && directory[0] == '/' && directory.size() <= 64;
+}
+
+// A service's own runtime directory (RuntimeDirectory=, the first one when
+// there are several): private to it, so no other user can squat its paths,
+// writable under ProtectSystem=strict, and seen by the daemons, which a
+// PrivateTmp /tmp is not. "" when there is none this process can use.
+std::string serviceRuntimeDirectory() {
+  const char* listed = std::getenv("RUNTIME_DIRECTORY");
+  if (listed == nullptr) return "";
+  const char* colon = std::strchr(listed, ':');
+  const std::string first = colon ? std::string(listed, colon) : std::string(listed);
+  const bool usable = fitsSocketPaths(first) && ::access(first.c_str(), W_OK | X_OK) == 0;
+  return usable ? first : "";
+}
+
+}  // namespace
+
 std::string UdsClient::defaultDirectory() {
+  const std::string runtime = serviceRuntimeDirectory();
+  if (!runtime.empty()) return runtime;
   const char* tmp = std::getenv("TMPDIR");
-  // Room for "/kopdm.<pid>.<n>" in a socket path of 107 bytes.
-  if (tmp != nullptr && tmp[0] == '/' && std::strlen(tmp) <= 64) return tmp;
+  if (tmp != nullptr && fitsSocketPaths(tmp)) return tmp;
   return "/tmp";
 }
 

@@ -15,7 +15,9 @@ does after unpacking the .debs). Then:
    installed marker /etc/korvane/share/share.dir led the installed plug-in
    to the installed texts;
 3. the installed service unit is checked by `systemd-analyze verify` in the
-   same namespace, when the machine has systemd-analyze.
+   same namespace, when the machine has systemd-analyze;
+4. the build folder installed again with `--prefix` another prefix: the
+   marker and the unit name that prefix, not the configured one.
 
 Needs root (a mount namespace); exits 77, which CTest reports as skipped,
 with the reason when it cannot have one."""
@@ -144,6 +146,27 @@ def unit_problems(root, unit):
     return []
 
 
+def prefix_problems(build):
+    """Installs `build` with a prefix it was not configured for."""
+    prefix = "/opt/quillon-elsewhere"
+    with tempfile.TemporaryDirectory(prefix="quillon-prefix-") as root:
+        install = subprocess.run(["cmake", "--install", build, "--prefix", prefix],
+                                 env=environment(DESTDIR=root), capture_output=True, text=True)
+        if install.returncode != 0:
+            return [f"cmake --install --prefix {prefix} failed:\n{install.stdout}{install.stderr}"]
+        with open(os.path.join(root, "etc/korvane/share/share.dir"), encoding="utf-8") as file:
+            marker = file.read()
+        with open(os.path.join(root, prefix.lstrip("/"), "lib/systemd/system/ws-runtime.service"),
+                  encoding="utf-8") as file:
+            unit = file.read()
+    problems = []
+    if marker != prefix + "/share/korvane\n":
+        problems.append(f"installed with --prefix {prefix}, the marker says {marker!r}")
+    if f"\nExecStart={prefix}/bin/ws-runtime " not in unit:
+        problems.append(f"installed with --prefix {prefix}, the unit starts another program:\n{unit}")
+    return problems
+
+
 def main():
     parser = argparse.ArgumentParser()
     source = parser.add_mutually_exclusive_group(required=True)
@@ -155,6 +178,12 @@ def main():
     parser.add_argument("--explanations", required=True, help="the shipped English explanation file")
     arguments = parser.parse_args()
 
+    if arguments.install_build:
+        problems = prefix_problems(arguments.install_build)
+        if problems:
+            print("\n".join(problems))
+            return 1
+        print("installed with another --prefix, the marker and the unit name that prefix")
     if os.geteuid() != 0:
         print("SKIP: needs root for a private mount namespace, so that the installed marker under "
               "/etc/korvane is the one read without changing this machine's /etc")

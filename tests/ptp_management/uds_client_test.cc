@@ -11,6 +11,7 @@
 
 #include <cerrno>
 #include <future>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -197,4 +198,27 @@ TEST(UdsClient, PathsAreTheClientsOwnAndNeverLeftBehind) {
 }
 
 }  // namespace
+// A service's runtime directory wins when it can hold client paths.
+TEST(UdsClient, ClientPathsGoToTheServiceRuntimeDirectoryWhenItIsUsable) {
+  answers_test::ScratchDir dir;
+  const std::string missing = dir.str() + "/gone";
+  const struct {
+    std::optional<std::string> runtime;
+    std::string expected;
+  } cases[] = {
+      {dir.str(), dir.str()},
+      {dir.str() + ":/run/other", dir.str()},
+      {missing, "/var/tmp"},
+      {"relative", "/var/tmp"},
+      {"/" + std::string(64, 'x'), "/var/tmp"},
+      {std::nullopt, "/var/tmp"},
+  };
+  answers_test::ScopedEnv tmp("TMPDIR", "/var/tmp");
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.runtime.value_or("(unset)"));
+    answers_test::ScopedEnv runtime("RUNTIME_DIRECTORY", c.runtime);
+    EXPECT_EQ(UdsClient::defaultDirectory(), c.expected);
+  }
+}
+
 }  // namespace ptpmgmt

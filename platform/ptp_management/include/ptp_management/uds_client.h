@@ -37,8 +37,9 @@ class UdsClient {
   // Opens and binds a socket at a new path in `directory` (null result and
   // `*failure` set when the system refuses).
   static std::unique_ptr<UdsClient> open(const std::string& directory, SystemFailure* failure);
-  // The directory for client sockets: $TMPDIR when it is short enough for a
-  // socket path, else /tmp.
+  // The directory for client sockets: the service's $RUNTIME_DIRECTORY when
+  // it is there, writable and short enough for a socket path; else $TMPDIR
+  // when that is short enough; else /tmp.
   static std::string defaultDirectory();
 
   ~UdsClient();  // closes the socket and removes its path
