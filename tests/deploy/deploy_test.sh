@@ -175,6 +175,10 @@ leftovers() {
 
 cleanup() {
   local status=$?
+  if [ $status -ne 0 ] && [ -n "$unshare_pid" ]; then
+    echo "-- the sandbox's journal, last lines:"
+    inside journalctl --no-pager -n 60 2>&1 || true
+  fi
   poweroff
   local problems=""
   [ -n "$scratch" ] && problems=$(leftovers)
@@ -203,15 +207,15 @@ wait_for() {  # SECONDS DESCRIPTION COMMAND...: retries COMMAND until it succeed
   shift 2
   local deadline=$((SECONDS + limit))
   until "$@"; do
-    [ $SECONDS -lt $deadline ] || fail "$what: not within $limit s"
+    [ $SECONDS -lt $deadline ] || fail "$what: not within $limit s${last_answer:+; the last answer: $last_answer}"
     sleep 0.05
   done
 }
 
+last_answer=""
 answers() {  # PATTERN METHOD PATH: the answer matches PATTERN
-  local answer
-  answer=$(http "$2" "$3")
-  [[ "$answer" == $1 ]]
+  last_answer=$(http "$2" "$3")
+  [[ "$last_answer" == $1 ]]
 }
 
 exposure() {
@@ -243,7 +247,7 @@ start_ptp_domain() {
   inside ip link set q20s up
   inside ip -n q20m link set lo up
   inside ip -n q20m link set q20m up
-  local common='free_running 1\nuse_syslog 0\nverbose 1\nlogAnnounceInterval -2\nlogSyncInterval -2\nannounceReceiptTimeout 2\n'
+  local common='free_running 1\nnetwork_transport L2\nlogAnnounceInterval -2\nlogSyncInterval -2\nannounceReceiptTimeout 2\n'
   inside sh -c "printf '[global]\n${common}slaveOnly 1\n' > /etc/linuxptp/q20-slave.conf"
   inside sh -c "printf '[global]\n${common}priority1 100\nuds_address /run/q20-master\n' > /etc/linuxptp/q20-master.conf"
   inside mkdir -p /etc/systemd/system/ptp4l@q20s.service.d
