@@ -8,6 +8,7 @@ packages=(
   libgtest-dev libgmock-dev libbenchmark-dev
   libcjson-dev libjansson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
   linuxptp iproute2
+  systemd dpkg-dev binutils curl
   python3 python3-jsonschema python3-yaml
 )
 # Extra sets for the optional tools: 'fuzz', 'perf' and 'package' (see README).

@@ -15,10 +15,7 @@ fi
 marker="$root/$build/share.dir"
 printf '%s\n' "$root/data/share" > "$marker"
 export KOSYSQ_SHARE_DIR_FILE="$marker"
-# The device's coherency requirements outlive a restart here too, in the
-# build folder, unless the caller names another place (docs/device.md).
-if [ -z "${KOSDLIB_STATE_DIRECTORY+set}" ]; then
-  export KOSDLIB_STATE_DIRECTORY="$root/$build/state"
-  mkdir -p "$KOSDLIB_STATE_DIRECTORY"
-fi
+# A playground starts afresh: the device keeps its coherency requirements in
+# memory only, unless the caller names a state directory (docs/device.md).
+export KOSDLIB_STATE_DIRECTORY="${KOSDLIB_STATE_DIRECTORY:-}"
 exec "$host" --listen "$listen"

@@ -36,23 +36,32 @@ typedef struct kosdlib_SyncableDevice* kosdlib_SyncableDeviceHandle;
 /* A new device for `uri` (non-empty); `kind` names the plug-in that drives it
  * and shows in the document as "plugin". Null, with -52005 in `status`, when
  * an argument is missing; null with -52000 when memory runs out. Device
- * plug-ins call this; applications call the plug-in's own create function. */
+ * plug-ins call this; applications call the plug-in's own create function.
+ * With a state directory (KOSDLIB_STATE_DIRECTORY, else STATE_DIRECTORY) the
+ * device starts with the requirements last stored there for its URI; a state
+ * file it cannot use is renamed aside and reported on standard error. */
 KOSDLIB_EXPORT kosdlib_SyncableDeviceHandle kosdlib_SyncableDevice_create(
     const char* uri, const char* kind, kosdlib_Status* status);
 
 /* Frees the handle and everything it holds. A null handle is ignored. */
 KOSDLIB_EXPORT void kosdlib_SyncableDevice_delete(kosdlib_SyncableDeviceHandle device);
 
-/* Stores `requirements`, which must be one JSON object, as the device's
- * coherency requirements (kept without insignificant white space). `scope` is
- * reserved for future use: pass "". Anything that is not a JSON object fails
- * with -52005 ("koapalerr_invalidParameter") and the stored requirements stay
- * as they were. */
+/* Stores `requirements`, which must be exactly one strict JSON object (UTF-8,
+ * no byte-order mark, no raw control bytes in strings, no duplicate names)
+ * whose "maxOffsetNanos", if any, is an integer from 0 to 2^63-1, as the
+ * device's coherency requirements (kept without insignificant white space).
+ * `scope` is reserved for future use: pass "". Anything else fails with
+ * -52005 ("koapalerr_invalidParameter"), naming the problem and its byte
+ * offset. With a state directory the requirements are on disk before the
+ * call returns; when they cannot be saved it fails with -52008
+ * ("koapalerr_osFault"). On failure the stored requirements stay as they
+ * were. */
 KOSDLIB_EXPORT void kosdlib_SyncableDevice_setCoherencyRequirements(
     kosdlib_SyncableDeviceHandle device, const char* requirements, const char* scope,
     kosdlib_Status* status);
 
-/* Forgets the coherency requirements. `scope` as above. */
+/* Forgets the coherency requirements, on disk too. `scope` and -52008 as
+ * above. */
 KOSDLIB_EXPORT void kosdlib_SyncableDevice_clearCoherencyRequirements(
     kosdlib_SyncableDeviceHandle device, const char* scope, kosdlib_Status* status);
 
