@@ -62,13 +62,9 @@ build_packages() {
 scratch=""
 canary=""
 cgroup=""
-cgroup_hierarchies=()
+cgroup_hierarchies=()  # the named and unified ones (hybrid), or the one (version 2)
 for hierarchy in /sys/fs/cgroup/systemd /sys/fs/cgroup/unified /sys/fs/cgroup; do
-  if [ -f "$hierarchy/cgroup.procs" ]; then
-    cgroup_hierarchies+=("$hierarchy")
-    # A pure version 2 hierarchy has no named ones beside it.
-    [ "$hierarchy" = /sys/fs/cgroup ] || continue
-  fi
+  [ -f "$hierarchy/cgroup.procs" ] && cgroup_hierarchies+=("$hierarchy")
 done
 unshare_pid=""
 sandbox_pid=""
@@ -218,11 +214,13 @@ answers() {  # PATTERN METHOD PATH: the answer matches PATTERN
   [[ "$last_answer" == $1 ]]
 }
 
-exposure() {
-  inside systemd-analyze security ws-runtime.service 2>&1 | sed -n 's/.*Overall exposure level for ws-runtime.service: //p'
+exposure() {  # the figure, which must stay at or below 2.0
+  local figure
+  figure=$(inside systemd-analyze security ws-runtime.service 2>&1 |
+           sed -n 's/.*Overall exposure level for ws-runtime.service: \([0-9.]*\).*/\1/p')
+  awk -v e="$figure" 'BEGIN { exit !(e != "" && e <= 2.0) }' || fail "exposure '$figure' is above 2.0"
+  echo "$figure"
 }
-
-service_result() { inside systemctl show -P Result ws-runtime.service; }
 
 # ---------------------------------------------------------------- steps
 install_packages() {
@@ -288,9 +286,9 @@ enable_live_mode() {
 
 requirements_survive() {
   step "requirements outlive a restart and a SIGKILL"
-  local body answer
+  local body answer bound=1000000000
   for round in restart kill; do
-    body="{\"maxOffsetNanos\":$((RANDOM + 1000000000))}"
+    body="{\"maxOffsetNanos\":$((bound += 1))}"
     answer=$(http PUT "$DEVICE" "$body")
     [[ "$answer" == 200* ]] || fail "PUT $body: $answer"
     local before
@@ -317,7 +315,7 @@ stop_and_purge() {
   step "stop, then purge"
   inside systemctl stop ws-runtime.service
   local result
-  result=$(service_result)
+  result=$(inside systemctl show -P Result ws-runtime.service)
   [ "$result" = success ] || fail "systemctl stop ended with result $result"
   echo "stopped with result $result"
   inside test -d /var/lib/private/ws-runtime || fail "no state directory before the purge"
