@@ -75,7 +75,8 @@ set -e
 scratch=$1
 mount -t tmpfs -o mode=0755 sandbox "$scratch"
 mkdir "$scratch/upper" "$scratch/work" "$scratch/root"
-mount -t overlay overlay -o "lowerdir=/,upperdir=$scratch/upper,workdir=$scratch/work" "$scratch/root"
+mount -t overlay overlay \
+  -o "lowerdir=/,upperdir=$scratch/upper,workdir=$scratch/work" "$scratch/root"
 root=$scratch/root
 mount -t proc proc "$root/proc"
 # sysfs read-only, so that nothing in the sandbox (udev) writes to this
@@ -118,12 +119,14 @@ boot() {
   for i in $(seq 100); do
     sandbox_pid=$(pgrep -P "$unshare_pid" || true)
     [ -n "$sandbox_pid" ] && [ "$(cat "/proc/$sandbox_pid/comm" 2>/dev/null)" = systemd ] && break
-    kill -0 "$unshare_pid" 2> /dev/null || { cat "$work_dir/systemd.log"; fail "the sandbox did not start"; }
+    kill -0 "$unshare_pid" 2> /dev/null ||
+      { cat "$work_dir/systemd.log"; fail "the sandbox did not start"; }
     sleep 0.1
   done
   local started=$SECONDS state
   # Until systemd listens, systemctl cannot connect at all.
-  while state=$(inside timeout 60 systemctl is-system-running --wait 2>&1); [[ "$state" == Failed* ]]; do
+  while state=$(inside timeout 60 systemctl is-system-running --wait 2>&1)
+        [[ "$state" == Failed* ]]; do
     [ $((SECONDS - started)) -lt 60 ] || break
     sleep 0.1
   done
@@ -132,6 +135,7 @@ boot() {
 }
 
 inside() { nsenter -t "$sandbox_pid" -m -p -n -- "$@"; }
+write_inside() { inside sh -c 'cat > "$1"' sh "$1"; }  # FILE: from standard input
 
 poweroff() {
   [ -n "$unshare_pid" ] || return 0
@@ -164,7 +168,8 @@ leftovers() {
     problems+="the sandbox's systemd ($sandbox_pid) still runs; "
   local hierarchy
   for hierarchy in "${cgroup_hierarchies[@]}"; do
-    [ -n "$cgroup" ] && [ -d "$hierarchy/$cgroup" ] && problems+="the control group $hierarchy/$cgroup is left; "
+    [ -n "$cgroup" ] && [ -d "$hierarchy/$cgroup" ] &&
+      problems+="the control group $hierarchy/$cgroup is left; "
   done
   echo "$problems"
 }
@@ -203,7 +208,8 @@ wait_for() {  # SECONDS DESCRIPTION COMMAND...: retries COMMAND until it succeed
   shift 2
   local deadline=$((SECONDS + limit))
   until "$@"; do
-    [ $SECONDS -lt $deadline ] || fail "$what: not within $limit s${last_answer:+; the last answer: $last_answer}"
+    [ $SECONDS -lt $deadline ] ||
+      fail "$what: not within $limit s${last_answer:+; the last answer: $last_answer}"
     sleep 0.05
   done
 }
@@ -218,7 +224,8 @@ exposure() {  # the figure, which must stay at or below 2.0
   local figure
   figure=$(inside systemd-analyze security ws-runtime.service 2>&1 |
            sed -n 's/.*Overall exposure level for ws-runtime.service: \([0-9.]*\).*/\1/p')
-  awk -v e="$figure" 'BEGIN { exit !(e != "" && e <= 2.0) }' || fail "exposure '$figure' is above 2.0"
+  awk -v e="$figure" 'BEGIN { exit !(e != "" && e <= 2.0) }' ||
+    fail "exposure '$figure' is above 2.0"
   echo "$figure"
 }
 
@@ -246,12 +253,20 @@ start_ptp_domain() {
   inside ip link set q20s up
   inside ip -n q20m link set lo up
   inside ip -n q20m link set q20m up
-  local common='free_running 1\nnetwork_transport L2\nlogAnnounceInterval -2\nlogSyncInterval -2\nannounceReceiptTimeout 2\n'
-  inside sh -c "printf '[global]\n${common}slaveOnly 1\n' > /etc/linuxptp/q20-slave.conf"
-  inside sh -c "printf '[global]\n${common}priority1 100\nuds_address /run/q20-master\n' > /etc/linuxptp/q20-master.conf"
+  # Never adjust this machine's clock; short intervals for quick state changes.
+  local common=$'[global]\nfree_running 1\nnetwork_transport L2\nlogAnnounceInterval -2\n'
+  common+=$'logSyncInterval -2\nannounceReceiptTimeout 2\n'
+  printf '%sslaveOnly 1\n' "$common" | write_inside /etc/linuxptp/q20-slave.conf
+  printf '%spriority1 100\nuds_address /run/q20-master\n' "$common" |
+    write_inside /etc/linuxptp/q20-master.conf
   inside mkdir -p /etc/systemd/system/ptp4l@q20s.service.d
-  inside sh -c 'printf "[Service]\nExecStart=\nExecStart=/usr/sbin/ptp4l -f /etc/linuxptp/q20-slave.conf -S -i %%I\n" > /etc/systemd/system/ptp4l@q20s.service.d/test.conf'
+  printf '[Service]\nExecStart=\nExecStart=%s\n' \
+    '/usr/sbin/ptp4l -f /etc/linuxptp/q20-slave.conf -S -i %I' |
+    write_inside /etc/systemd/system/ptp4l@q20s.service.d/test.conf
   inside systemctl daemon-reload
+  # The machine's clock is at stake: only ever a free-running daemon.
+  inside systemctl show -P ExecStart ptp4l@q20s.service | grep -q 'q20-slave.conf -S -i q20s' ||
+    fail "the test drop-in of ptp4l@q20s.service is not in effect"
   inside systemctl start ptp4l@q20s.service
   inside systemd-run --quiet --unit q20-master ip netns exec q20m \
     /usr/sbin/ptp4l -f /etc/linuxptp/q20-master.conf -S -i q20m
@@ -268,8 +283,8 @@ slave_state() { pmc_slave "GET PORT_DATA_SET" | grep -q "portState *SLAVE"; }
 enable_live_mode() {
   step "live mode as the docs say: configuration, KOPDM_PTP4L_CONFIG, restart"
   inside mkdir -p /etc/quillon
-  inside sh -c 'echo "{\"timeReferences\":[{\"id\":\"tr0\",\"uds\":\"/var/run/ptp4l\"}]}" > /etc/quillon/tr.json'
-  inside sh -c 'echo "KOPDM_PTP4L_CONFIG=/etc/quillon/tr.json" >> /etc/default/ws-runtime'
+  echo '{"timeReferences":[{"id":"tr0","uds":"/var/run/ptp4l"}]}' | write_inside /etc/quillon/tr.json
+  echo "KOPDM_PTP4L_CONFIG=/etc/quillon/tr.json" | inside tee -a /etc/default/ws-runtime > /dev/null
   local started
   started=$(date +%s%N)
   inside systemctl restart ws-runtime.service
@@ -345,7 +360,8 @@ main() {
   enable_live_mode
   requirements_survive
   stop_and_purge
-  echo "exposure (systemd-analyze security ws-runtime.service): simulated $simulated_exposure, live $live_exposure"
+  echo "systemd-analyze security ws-runtime.service: exposure $simulated_exposure simulated," \
+       "$live_exposure live"
 }
 
 main

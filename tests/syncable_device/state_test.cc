@@ -22,7 +22,8 @@ using answers_test::ScratchDir;
 using kosdplugins::pendulo::wrapper::SyncableDeviceActual;
 
 constexpr const char* kUri = "/quillon/syncableDevices/pendulo/timekeeper/genericTk";
-constexpr const char* kStateName = "device.quillon.syncableDevices.pendulo.timekeeper.genericTk.json";
+constexpr const char* kStateName =
+    "device.quillon.syncableDevices.pendulo.timekeeper.genericTk.json";
 
 // The machine's calls, with call number `failAt` (from 1) failing with EIO.
 class FailingFiles : public kosdlib::PosixFileSystem {
@@ -30,11 +31,21 @@ class FailingFiles : public kosdlib::PosixFileSystem {
   explicit FailingFiles(int failAt) : failAt_(failAt) {}
   std::vector<std::string> calls;
 
-  int open(const char* p, int f, mode_t m) override { return fails("open") ? -1 : PosixFileSystem::open(p, f, m); }
-  ssize_t write(int fd, const void* d, size_t n) override { return fails("write") ? -1 : PosixFileSystem::write(fd, d, n); }
+  int open(const char* path, int flags, mode_t mode) override {
+    return fails("open") ? -1 : PosixFileSystem::open(path, flags, mode);
+  }
+  ssize_t write(int fd, const void* data, size_t size) override {
+    return fails("write") ? -1 : PosixFileSystem::write(fd, data, size);
+  }
   int fsync(int fd) override { return fails("fsync") ? -1 : PosixFileSystem::fsync(fd); }
-  int close(int fd) override { PosixFileSystem::close(fd); return fails("close") ? -1 : 0; }
-  int rename(const char* a, const char* b) override { return fails("rename") ? -1 : PosixFileSystem::rename(a, b); }
+  // A close that fails has still released the descriptor.
+  int close(int fd) override {
+    PosixFileSystem::close(fd);
+    return fails("close") ? -1 : 0;
+  }
+  int rename(const char* from, const char* to) override {
+    return fails("rename") ? -1 : PosixFileSystem::rename(from, to);
+  }
 
  private:
   bool fails(const char* call) {
@@ -57,8 +68,8 @@ TEST(DeviceState, AReplacementCutShortLeavesTheOldStateOrTheNew) {
       kosdlib::StateFile state(files, scratch.file("state"));
       std::string content;
       kosdlib::FileFailure failure;
-      ASSERT_EQ(state.read(&content, &failure),
-                hadState ? kosdlib::StateFile::Found::kContent : kosdlib::StateFile::Found::kNothing);
+      using Found = kosdlib::StateFile::Found;
+      ASSERT_EQ(state.read(&content, &failure), hadState ? Found::kContent : Found::kNothing);
       *files = FailingFiles(failAt);
       const bool replaced = state.replace("new", &failure);
       const bool failedMidway = failAt <= static_cast<int>(files->calls.size());
@@ -92,7 +103,8 @@ TEST_F(StatefulDevice, AcceptedRequirementsOutliveTheDevice) {
   }
   EXPECT_EQ(scratch_.read(kStateName), "{\"maxOffsetNanos\":0}\n");
   SyncableDeviceActual device(kUri);
-  EXPECT_NE(device.toJson().find("\"coherencyRequirements\":{\"maxOffsetNanos\":0},"), std::string::npos);
+  EXPECT_NE(device.toJson().find("\"coherencyRequirements\":{\"maxOffsetNanos\":0},"),
+            std::string::npos);
   EXPECT_EQ(device.isCoherent(0), 0);
   device.clearCoherencyRequirements("");
   EXPECT_EQ(scratch_.read(kStateName), "null\n");
@@ -103,11 +115,14 @@ TEST_F(StatefulDevice, AStateThatCannotBeSavedKeepsThePreviousInForce) {
   device.setCoherencyRequirements("{\"maxOffsetNanos\":7}", "");
   const std::string before = device.toJson();
   std::filesystem::remove_all(scratch_.path());
-  const auto raised = quillon::test_support::raisedBy([&] { device.setCoherencyRequirements("{}", ""); });
+  const auto raised =
+      quillon::test_support::raisedBy([&] { device.setCoherencyRequirements("{}", ""); });
   EXPECT_EQ(raised.code, -52008);
-  EXPECT_NE(raised.record.find("\"stateFile\":\"" + scratch_.file(kStateName) + ".new\",\"systemCall\":\"open\","
+  EXPECT_NE(raised.record.find("\"stateFile\":\"" + scratch_.file(kStateName) +
+                               ".new\",\"systemCall\":\"open\","
                                "\"systemError\":\"No such file or directory\""),
-            std::string::npos) << raised.record;
+            std::string::npos)
+      << raised.record;
   EXPECT_EQ(device.toJson(), before);
 }
 
@@ -123,9 +138,9 @@ TEST_F(StatefulDevice, AnUnusableStateIsSetAsideAndNamedInTheLog) {
     EXPECT_EQ(scratch_.read(kStateName + aside), bad);
     EXPECT_FALSE(std::filesystem::exists(scratch_.file(kStateName)));
     EXPECT_EQ(log, "kosdlib: the state file " + scratch_.file(kStateName) +
-                       " cannot be parsed (The coherency requirements' \"maxOffsetNanos\" must be an "
-                       "integer from 0 to 9223372036854775807. At byte 18.); moved aside to " +
-                       scratch_.file(kStateName) + aside +
+                       " cannot be parsed (The coherency requirements' \"maxOffsetNanos\" must "
+                       "be an integer from 0 to 9223372036854775807. At byte 18.); moved aside "
+                       "to " + scratch_.file(kStateName) + aside +
                        "; the device starts without coherency requirements\n");
   }
 }

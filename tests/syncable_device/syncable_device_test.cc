@@ -85,7 +85,8 @@ TEST(SyncableDevice, RequirementsAreOneStrictObjectWithAnIntegerBound) {
       {"{\"maxOffsetNanos\":1e-999}", bound, 18},
       {"{\"maxOffsetNanos\":1.0}", bound, 18},
       // Nested members and strings do not count; escaped names do.
-      {"{\"a\":{\"maxOffsetNanos\":1},\"s\":\"\\\",\\\"maxOffsetNanos\\\":\", \"max\\u004FffsetNanos\" :\t-5}",
+      {"{\"a\":{\"maxOffsetNanos\":1},\"s\":\"\\\",\\\"maxOffsetNanos\\\":\", "
+       "\"max\\u004FffsetNanos\" :\t-5}",
        bound, 80},
   };
   for (const Case& c : cases) {
