@@ -111,7 +111,8 @@ boot() {
       mkdir -p "$hierarchy/$cgroup"
       echo "$BASHPID" > "$hierarchy/$cgroup/cgroup.procs"
     done
-    exec unshare --pid --mount --net --fork --propagation private -- \
+    # --kill-child: should this script be killed outright, the sandbox goes too.
+    exec unshare --pid --mount --net --fork --kill-child --propagation private -- \
       bash -c "$boot_script" boot "$scratch" "$package_dir"
   ) > "$work_dir/systemd.log" 2>&1 &
   unshare_pid=$!
@@ -353,6 +354,7 @@ main() {
   ls "$package_dir"/quillon_*.deb "$package_dir"/quillon-platform_*.deb > /dev/null ||
     fail "no packages in $package_dir"
   trap cleanup EXIT
+  trap 'exit 143' TERM INT
   boot
   install_packages
   serve_simulated
