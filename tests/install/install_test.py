@@ -149,22 +149,16 @@ def unit_problems(root, unit):
 def prefix_problems(build):
     """Installs `build` with a prefix it was not configured for."""
     prefix = "/opt/quillon-elsewhere"
+    expected = {"etc/korvane/share/share.dir": prefix + "/share/korvane\n",
+                prefix[1:] + "/lib/systemd/system/ws-runtime.service": f"ExecStart={prefix}/bin/ws-runtime "}
     with tempfile.TemporaryDirectory(prefix="quillon-prefix-") as root:
         install = subprocess.run(["cmake", "--install", build, "--prefix", prefix],
                                  env=environment(DESTDIR=root), capture_output=True, text=True)
         if install.returncode != 0:
             return [f"cmake --install --prefix {prefix} failed:\n{install.stdout}{install.stderr}"]
-        with open(os.path.join(root, "etc/korvane/share/share.dir"), encoding="utf-8") as file:
-            marker = file.read()
-        with open(os.path.join(root, prefix.lstrip("/"), "lib/systemd/system/ws-runtime.service"),
-                  encoding="utf-8") as file:
-            unit = file.read()
-    problems = []
-    if marker != prefix + "/share/korvane\n":
-        problems.append(f"installed with --prefix {prefix}, the marker says {marker!r}")
-    if f"\nExecStart={prefix}/bin/ws-runtime " not in unit:
-        problems.append(f"installed with --prefix {prefix}, the unit starts another program:\n{unit}")
-    return problems
+        texts = {path: open(os.path.join(root, path), encoding="utf-8").read() for path in expected}
+    return [f"installed with --prefix {prefix}, /{path} lacks {part!r}:\n{texts[path]}"
+            for path, part in expected.items() if part not in texts[path]]
 
 
 def main():
@@ -178,12 +172,10 @@ def main():
     parser.add_argument("--explanations", required=True, help="the shipped English explanation file")
     arguments = parser.parse_args()
 
-    if arguments.install_build:
-        problems = prefix_problems(arguments.install_build)
-        if problems:
-            print("\n".join(problems))
-            return 1
-        print("installed with another --prefix, the marker and the unit name that prefix")
+    problems = prefix_problems(arguments.install_build) if arguments.install_build else []
+    if problems:
+        print("\n".join(problems))
+        return 1
     if os.geteuid() != 0:
         print("SKIP: needs root for a private mount namespace, so that the installed marker under "
               "/etc/korvane is the one read without changing this machine's /etc")

@@ -201,14 +201,13 @@ TEST(UdsClient, PathsAreTheClientsOwnAndNeverLeftBehind) {
 // A service's runtime directory wins when it can hold client paths.
 TEST(UdsClient, ClientPathsGoToTheServiceRuntimeDirectoryWhenItIsUsable) {
   answers_test::ScratchDir dir;
-  const std::string missing = dir.str() + "/gone";
   const struct {
     std::optional<std::string> runtime;
     std::string expected;
   } cases[] = {
       {dir.str(), dir.str()},
       {dir.str() + ":/run/other", dir.str()},
-      {missing, "/var/tmp"},
+      {dir.str() + "/gone", "/var/tmp"},
       {"relative", "/var/tmp"},
       {"/" + std::string(64, 'x'), "/var/tmp"},
       {std::nullopt, "/var/tmp"},
