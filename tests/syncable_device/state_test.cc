@@ -73,13 +73,12 @@ TEST(DeviceState, AReplacementCutShortLeavesTheOldStateOrTheNew) {
       *files = FailingFiles(failAt);
       const bool replaced = state.replace("new", &failure);
       const bool failedMidway = failAt <= static_cast<int>(files->calls.size());
-      const bool exists = std::filesystem::exists(scratch.file("state"));
       if (replaced) {
         EXPECT_EQ(scratch.read("state"), "new");
       } else {
         EXPECT_EQ(failure.call, files->calls[failAt - 1]);
         EXPECT_EQ(failure.error, EIO);
-        EXPECT_EQ(exists, hadState);
+        EXPECT_EQ(std::filesystem::exists(scratch.file("state")), hadState);
         if (hadState) {
           EXPECT_EQ(scratch.read("state"), "old");
         }

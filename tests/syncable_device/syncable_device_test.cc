@@ -108,7 +108,6 @@ TEST(SyncableDevice, BoundsAtTheEdgesAreKept) {
     bool coherent;
   } cases[] = {
       {"{\"maxOffsetNanos\":0}", "{\"maxOffsetNanos\":0}", false},
-      {"{\"maxOffsetNanos\":-0}", "{\"maxOffsetNanos\":-0}", false},
       {"{\"maxOffsetNanos\":250}", "{\"maxOffsetNanos\":250}", true},
       {"{\"maxOffsetNanos\":249}", "{\"maxOffsetNanos\":249}", false},
       {"{\"maxOffsetNanos\":9223372036854775807}", "{\"maxOffsetNanos\":9223372036854775807}",
