@@ -25,6 +25,7 @@ readonly SKIP=77
 readonly DEVICE=/quillon/syncableDevices/pendulo/timekeeper/genericTk
 readonly MASTER_MAC=02:51:00:00:00:01
 readonly MASTER_ID=02-51-00-FF-FE-00-00-01
+readonly LISTEN=127.0.0.1:18020  # set in /etc/default/ws-runtime, as a user would
 readonly VENDOR="Content-Type: vnd.ko.syncDomain.v0/json; charset=utf-8"
 
 skip() { echo "SKIP: $*"; exit $SKIP; }
@@ -197,7 +198,7 @@ cleanup() {
 
 # ---------------------------------------------------------------- inside helpers
 http() {  # METHOD PATH [BODY]: prints "STATUS BODY"
-  local args=(-s -o /dev/stdout -w ' %{http_code}' -X "$1" "http://127.0.0.1:8080$2")
+  local args=(-s -o /dev/stdout -w ' %{http_code}' -X "$1" "http://$LISTEN$2")
   [ $# -ge 3 ] && args+=(-H "$VENDOR" --data-binary "$3")
   local out
   out=$(inside curl "${args[@]}" 2> /dev/null) || true
@@ -240,6 +241,7 @@ install_packages() {
 
 serve_simulated() {
   step "simulated mode"
+  inside sed -i "s/^WS_RUNTIME_LISTEN=.*/WS_RUNTIME_LISTEN=$LISTEN/" /etc/default/ws-runtime
   inside systemctl start ws-runtime.service
   wait_for 10 "the simulated listing" answers '200 *"success":true*' GET /quillon/resources
   simulated_exposure=$(exposure)
