@@ -55,8 +55,7 @@ bool isName(const std::string& token, const char* name) {
 size_t memberValueOffset(const std::string& text, const char* name) {
   int depth = 0;
   bool expectName = false;
-  size_t nameStart = 0;
-  std::string lastName;
+  std::string lastName;  // the latest top-level name, quotes included
   for (size_t at = 0; at < text.size(); ++at) {
     const char c = text[at];
     if (c == '"') {
@@ -64,19 +63,15 @@ size_t memberValueOffset(const std::string& text, const char* name) {
       for (++at; text[at] != '"'; ++at) {
         if (text[at] == '\\') ++at;
       }
-      if (depth == 1 && expectName) {
-        nameStart = start;
-        lastName = text.substr(start, at + 1 - start);
-        expectName = false;
-      }
+      if (depth == 1 && expectName) lastName = text.substr(start, at + 1 - start);
+      expectName = false;
     } else if (c == '{' || c == '[') {
-      ++depth;
-      expectName = depth == 1;
+      expectName = ++depth == 1;
     } else if (c == '}' || c == ']') {
       --depth;
     } else if (c == ',' && depth == 1) {
       expectName = true;
-    } else if (c == ':' && depth == 1 && nameStart != 0 && isName(lastName, name)) {
+    } else if (c == ':' && depth == 1 && isName(lastName, name)) {
       return skipSpace(text, at + 1);
     }
   }
