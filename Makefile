@@ -4,7 +4,7 @@ SHELL := /bin/bash
 JOBS ?= $(shell nproc)
 LISTEN ?= 127.0.0.1:8080
 
-.PHONY: run run-ptp test deps release asan tsan tsan-test fuzz package package-test clean
+.PHONY: run run-ptp test deps release asan tsan tsan-test fuzz package package-test package-try clean
 
 deps:
 	@scripts/install-deps.sh
@@ -54,6 +54,11 @@ package:
 # plug-in from it, and removes them again (needs root).
 package-test: package
 	scripts/package-test.sh build/package
+
+# Boots a throw-away systemd over an overlay of / (needs root), installs the
+# packages in it and opens a shell there; leaving the shell powers it off.
+package-try: package
+	scripts/systemd-sandbox.sh build/package
 
 clean:
 	rm -rf build

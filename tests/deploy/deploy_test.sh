@@ -1,8 +1,6 @@
 #!/usr/bin/env bash
-# The packaged service as a new user deploys it, under a booted systemd:
-#   boot     systemd as PID 1 of new PID, mount and network namespaces over an
-#            overlay of / whose upper layer is a tmpfs (so its boot-time
-#            tmpfiles cleans the sandbox's /tmp, not this machine's);
+# The packaged service as a new user deploys it, under a booted systemd in the
+# sandbox of scripts/systemd-sandbox.sh:
 #   steps    both .deb packages installed with dpkg; the simulated service;
 #            linuxptp's own ptp4l@IFACE.service (a test drop-in: -S,
 #            free_running 1, slaveOnly 1) linked by a veth pair to a master
@@ -10,14 +8,16 @@
 #            enabled as docs/deploying.md says; requirements that outlive a
 #            restart and a SIGKILL; a clean stop; a purge that leaves no
 #            conffile and no state; the exposure figures of both modes;
-#   poweroff and checks: a canary in this machine's /tmp is still there, no
-#            mount, network namespace or process of the sandbox is left.
+#   checks   after power-off, a canary in this machine's /tmp is still there,
+#            no mount, network namespace or process of the sandbox is left.
 #
 #   deploy_test.sh SOURCE_DIR WORK_DIR [PACKAGE_DIR]
 # Without PACKAGE_DIR the packages are built first, in WORK_DIR/packages.
 # Exits 77 (skipped) with the reason where the machine cannot do it.
 set -euo pipefail
 source_dir=$(cd "${1:?source folder}" && pwd)
+# shellcheck source=../../scripts/systemd-sandbox.sh
+source "$source_dir/scripts/systemd-sandbox.sh"
 work_dir=${2:?work folder}
 package_dir=${3:-}
 
@@ -34,16 +34,12 @@ step() { echo "== $*"; }
 
 # ---------------------------------------------------------------- preconditions
 preconditions() {
-  [ "$(id -u)" -eq 0 ] || skip "needs root to create namespaces and mount an overlay"
-  grep -qw overlay /proc/filesystems || modprobe overlay 2>/dev/null ||
-    skip "the kernel has no overlay file system"
-  [ -x /lib/systemd/systemd ] || skip "systemd is not installed (Debian package systemd)"
-  local tool
+  local reason tool
+  reason=$(sandbox_can_boot)
+  [ -z "$reason" ] || skip "$reason"
   for tool in ptp4l pmc ip curl dpkg-deb unshare nsenter systemd-analyze; do
     command -v "$tool" > /dev/null || skip "$tool is not installed"
   done
-  unshare --pid --mount --net --fork true 2> /dev/null ||
-    skip "cannot create PID, mount and network namespaces here"
 }
 
 # ---------------------------------------------------------------- packages
@@ -59,138 +55,21 @@ build_packages() {
     { cat "$work_dir/cpack.log"; fail "cpack failed"; }
 }
 
-# ---------------------------------------------------------------- sandbox
-scratch=""
-canary=""
-cgroup=""
-cgroup_hierarchies=()  # the named and unified ones (hybrid), or the one (version 2)
-for hierarchy in /sys/fs/cgroup/systemd /sys/fs/cgroup/unified /sys/fs/cgroup; do
-  [ -f "$hierarchy/cgroup.procs" ] && cgroup_hierarchies+=("$hierarchy")
-done
-unshare_pid=""
-sandbox_pid=""
-
-# Runs in the new namespaces as their PID 1, then becomes systemd.
-boot_script='
-set -e
-scratch=$1
-mount -t tmpfs -o mode=0755 sandbox "$scratch"
-mkdir "$scratch/upper" "$scratch/work" "$scratch/root"
-mount -t overlay overlay \
-  -o "lowerdir=/,upperdir=$scratch/upper,workdir=$scratch/work" "$scratch/root"
-root=$scratch/root
-mount -t proc proc "$root/proc"
-# sysfs read-only, so that nothing in the sandbox (udev) writes to this
-# machine'"'"'s devices; the control groups below it stay writable for systemd.
-mount --rbind /sys "$root/sys"
-mount -o remount,bind,ro "$root/sys"
-mount --rbind /dev "$root/dev"
-for dir in run tmp var/tmp; do mount -t tmpfs -o mode=1777 "sandbox-${dir//\//-}" "$root/$dir"; done
-chmod 0755 "$root/run"
-mkdir -p "$root/root/quillon-debs"
-cp "$2"/*.deb "$root/root/quillon-debs/"
-mkdir -p "$root/.oldroot"
-cd "$root"
-pivot_root . .oldroot
-umount -l /.oldroot
-rmdir /.oldroot
-export container=quillon-deploy
-# basic.target: what services need, without the gettys (this machine'"'"'s
-# terminals) and the services this machine enables for itself.
-exec /lib/systemd/systemd --system --unit=basic.target
-'
-
-boot() {
-  step "booting systemd in new PID, mount and network namespaces over an overlay of /"
-  scratch=$(mktemp -d /tmp/quillon-deploy-XXXXXX)
-  canary=$(mktemp /tmp/quillon-deploy-canary-XXXXXX)
-  # A control group of its own, which the sandbox's systemd takes for its
-  # root, so that it manages nothing outside.
-  cgroup="quillon-deploy-$$"
-  (
-    for hierarchy in "${cgroup_hierarchies[@]}"; do
-      mkdir -p "$hierarchy/$cgroup"
-      echo "$BASHPID" > "$hierarchy/$cgroup/cgroup.procs"
-    done
-    # --kill-child: should this script be killed outright, the sandbox goes too.
-    exec unshare --pid --mount --net --fork --kill-child --propagation private -- \
-      bash -c "$boot_script" boot "$scratch" "$package_dir"
-  ) > "$work_dir/systemd.log" 2>&1 &
-  unshare_pid=$!
-  local i
-  for i in $(seq 100); do
-    sandbox_pid=$(pgrep -P "$unshare_pid" || true)
-    [ -n "$sandbox_pid" ] && [ "$(cat "/proc/$sandbox_pid/comm" 2>/dev/null)" = systemd ] && break
-    kill -0 "$unshare_pid" 2> /dev/null ||
-      { cat "$work_dir/systemd.log"; fail "the sandbox did not start"; }
-    sleep 0.1
-  done
-  local started=$SECONDS state
-  # Until systemd listens, systemctl cannot connect at all.
-  while state=$(inside timeout 60 systemctl is-system-running --wait 2>&1)
-        [[ "$state" == Failed* ]]; do
-    [ $((SECONDS - started)) -lt 60 ] || break
-    sleep 0.1
-  done
-  echo "systemd is $state after $((SECONDS - started)) s"
-  case "$state" in running|degraded) ;; *) fail "systemd did not come up: $state" ;; esac
-}
-
-inside() { nsenter -t "$sandbox_pid" -m -p -n -- "$@"; }
-write_inside() { inside sh -c 'cat > "$1"' sh "$1"; }  # FILE: from standard input
-
-poweroff() {
-  [ -n "$unshare_pid" ] || return 0
-  if kill -0 "$unshare_pid" 2> /dev/null; then
-    inside systemctl poweroff > /dev/null 2>&1 || true
-    local i
-    for i in $(seq 300); do kill -0 "$unshare_pid" 2> /dev/null || break; sleep 0.1; done
-    # PID 1 of the namespace takes every process of it along.
-    if kill -0 "$unshare_pid" 2> /dev/null; then
-      echo "systemd did not power off in 30 s: killing the sandbox" >&2
-      kill -KILL "$sandbox_pid" 2> /dev/null || true
-    fi
-  fi
-  wait "$unshare_pid" 2> /dev/null || true
-  unshare_pid=""
-  local hierarchy
-  for hierarchy in "${cgroup_hierarchies[@]}"; do
-    [ -n "$cgroup" ] && [ -d "$hierarchy/$cgroup" ] &&
-      find "$hierarchy/$cgroup" -depth -type d -exec rmdir {} + 2> /dev/null
-  done
-  return 0
-}
-
-leftovers() {
-  local problems=""
-  [ -f "$canary" ] || problems+="the canary $canary in this machine's /tmp is gone; "
-  grep -q "$scratch" /proc/self/mountinfo && problems+="a mount under $scratch is left; "
-  ip netns list 2> /dev/null | grep -q '^q20' && problems+="a q20 network namespace is left; "
-  [ -n "$sandbox_pid" ] && kill -0 "$sandbox_pid" 2> /dev/null &&
-    problems+="the sandbox's systemd ($sandbox_pid) still runs; "
-  local hierarchy
-  for hierarchy in "${cgroup_hierarchies[@]}"; do
-    [ -n "$cgroup" ] && [ -d "$hierarchy/$cgroup" ] &&
-      problems+="the control group $hierarchy/$cgroup is left; "
-  done
-  echo "$problems"
-}
-
 cleanup() {
   local status=$?
-  if [ $status -ne 0 ] && [ -n "$unshare_pid" ]; then
+  if [ $status -ne 0 ] && [ -n "$sandbox_unshare_pid" ]; then
     echo "-- the sandbox's journal, last lines:"
-    inside journalctl --no-pager -n 60 2>&1 || true
+    sandbox_inside journalctl --no-pager -n 60 2>&1 || true
   fi
-  poweroff
-  local problems=""
-  [ -n "$scratch" ] && problems=$(leftovers)
-  [ -n "$scratch" ] && rmdir "$scratch" 2> /dev/null
-  [ -n "$canary" ] && rm -f "$canary"
+  sandbox_poweroff
+  local problems
+  problems=$(sandbox_leftovers)
+  ip netns list 2> /dev/null | grep -q '^q20' && problems+="a q20 network namespace is left; "
+  sandbox_forget
   if [ -n "$problems" ]; then
     echo "FAIL: $problems" >&2
     status=1
-  elif [ -n "$scratch" ]; then
+  elif [ -n "$sandbox_scratch" ]; then
     echo "sandbox gone: canary kept, no mount, namespace or process left"
   fi
   exit $status
@@ -201,7 +80,7 @@ http() {  # METHOD PATH [BODY]: prints "STATUS BODY"
   local args=(-s -o /dev/stdout -w ' %{http_code}' -X "$1" "http://$LISTEN$2")
   [ $# -ge 3 ] && args+=(-H "$VENDOR" --data-binary "$3")
   local out
-  out=$(inside curl "${args[@]}" 2> /dev/null) || true
+  out=$(sandbox_inside curl "${args[@]}" 2> /dev/null) || true
   echo "${out##* } ${out% *}"
 }
 
@@ -224,7 +103,7 @@ answers() {  # PATTERN METHOD PATH: the answer matches PATTERN
 
 exposure() {  # the figure, which must stay at or below 2.0
   local figure
-  figure=$(inside systemd-analyze security ws-runtime.service 2>&1 |
+  figure=$(sandbox_inside systemd-analyze security ws-runtime.service 2>&1 |
            sed -n 's/.*Overall exposure level for ws-runtime.service: \([0-9.]*\).*/\1/p')
   awk -v e="$figure" 'BEGIN { exit !(e != "" && e <= 2.0) }' ||
     fail "exposure '$figure' is above 2.0"
@@ -234,63 +113,63 @@ exposure() {  # the figure, which must stay at or below 2.0
 # ---------------------------------------------------------------- steps
 install_packages() {
   step "dpkg --install both packages"
-  inside sh -c 'dpkg --install /root/quillon-debs/*.deb' > "$work_dir/dpkg.log" 2>&1 ||
+  sandbox_inside sh -c 'dpkg --install /root/debs/*.deb' > "$work_dir/dpkg.log" 2>&1 ||
     { cat "$work_dir/dpkg.log"; fail "dpkg --install failed"; }
-  inside dpkg-query -W -f '${Package} ${Version} ${Status}\n' quillon quillon-platform
+  sandbox_inside dpkg-query -W -f '${Package} ${Version} ${Status}\n' quillon quillon-platform
 }
 
 serve_simulated() {
   step "simulated mode"
-  inside sed -i "s/^WS_RUNTIME_LISTEN=.*/WS_RUNTIME_LISTEN=$LISTEN/" /etc/default/ws-runtime
-  inside systemctl start ws-runtime.service
+  sandbox_inside sed -i "s/^WS_RUNTIME_LISTEN=.*/WS_RUNTIME_LISTEN=$LISTEN/" /etc/default/ws-runtime
+  sandbox_inside systemctl start ws-runtime.service
   wait_for 10 "the simulated listing" answers '200 *"success":true*' GET /quillon/resources
   simulated_exposure=$(exposure)
   echo "simulated exposure: $simulated_exposure; the points it still counts:"
-  inside systemd-analyze security ws-runtime.service 2>&1 | grep '✗' || true
+  sandbox_inside systemd-analyze security ws-runtime.service 2>&1 | grep '✗' || true
 }
 
 start_ptp_domain() {
   step "ptp4l@q20s.service (linuxptp's unit with a test drop-in) and a master in netns q20m"
-  inside ip netns add q20m
-  inside ip link add q20s type veth peer name q20m address "$MASTER_MAC" netns q20m
-  inside ip link set q20s up
-  inside ip -n q20m link set lo up
-  inside ip -n q20m link set q20m up
+  sandbox_inside ip netns add q20m
+  sandbox_inside ip link add q20s type veth peer name q20m address "$MASTER_MAC" netns q20m
+  sandbox_inside ip link set q20s up
+  sandbox_inside ip -n q20m link set lo up
+  sandbox_inside ip -n q20m link set q20m up
   # Never adjust this machine's clock; short intervals for quick state changes.
   local common=$'[global]\nfree_running 1\nnetwork_transport L2\nlogAnnounceInterval -2\n'
   common+=$'logSyncInterval -2\nannounceReceiptTimeout 2\n'
-  printf '%sslaveOnly 1\n' "$common" | write_inside /etc/linuxptp/q20-slave.conf
+  printf '%sslaveOnly 1\n' "$common" | sandbox_write /etc/linuxptp/q20-slave.conf
   printf '%spriority1 100\nuds_address /run/q20-master\n' "$common" |
-    write_inside /etc/linuxptp/q20-master.conf
-  inside mkdir -p /etc/systemd/system/ptp4l@q20s.service.d
+    sandbox_write /etc/linuxptp/q20-master.conf
+  sandbox_inside mkdir -p /etc/systemd/system/ptp4l@q20s.service.d
   printf '[Service]\nExecStart=\nExecStart=%s\n' \
     '/usr/sbin/ptp4l -f /etc/linuxptp/q20-slave.conf -S -i %I' |
-    write_inside /etc/systemd/system/ptp4l@q20s.service.d/test.conf
-  inside systemctl daemon-reload
+    sandbox_write /etc/systemd/system/ptp4l@q20s.service.d/test.conf
+  sandbox_inside systemctl daemon-reload
   # The machine's clock is at stake: only ever a free-running daemon.
-  inside systemctl show -P ExecStart ptp4l@q20s.service | grep -q 'q20-slave.conf -S -i q20s' ||
+  sandbox_inside systemctl show -P ExecStart ptp4l@q20s.service | grep -q 'q20-slave.conf -S -i q20s' ||
     fail "the test drop-in of ptp4l@q20s.service is not in effect"
-  inside systemctl start ptp4l@q20s.service
-  inside systemd-run --quiet --unit q20-master ip netns exec q20m \
+  sandbox_inside systemctl start ptp4l@q20s.service
+  sandbox_inside systemd-run --quiet --unit q20-master ip netns exec q20m \
     /usr/sbin/ptp4l -f /etc/linuxptp/q20-master.conf -S -i q20m
-  wait_for 10 "the slave's management socket" inside test -S /var/run/ptp4l
-  echo "daemon socket: $(inside stat -c '%A %U %G %n' /var/run/ptp4l)"
+  wait_for 10 "the slave's management socket" sandbox_inside test -S /var/run/ptp4l
+  echo "daemon socket: $(sandbox_inside stat -c '%A %U %G %n' /var/run/ptp4l)"
   wait_for 20 "the slave to take the uncertainty 0" lock_slave
   wait_for 20 "the slave's port to be SLAVE" slave_state
 }
 
-pmc_slave() { inside pmc -u -b 0 -s /var/run/ptp4l "$@" 2>&1; }
+pmc_slave() { sandbox_inside pmc -u -b 0 -s /var/run/ptp4l "$@" 2>&1; }
 lock_slave() { pmc_slave "SET SYNCHRONIZATION_UNCERTAIN_NP 0" | grep -q "uncertain *0"; }
 slave_state() { pmc_slave "GET PORT_DATA_SET" | grep -q "portState *SLAVE"; }
 
 enable_live_mode() {
   step "live mode as the docs say: configuration, KOPDM_PTP4L_CONFIG, restart"
-  inside mkdir -p /etc/quillon
-  echo '{"timeReferences":[{"id":"tr0","uds":"/var/run/ptp4l"}]}' | write_inside /etc/quillon/tr.json
-  echo "KOPDM_PTP4L_CONFIG=/etc/quillon/tr.json" | inside tee -a /etc/default/ws-runtime > /dev/null
+  sandbox_inside mkdir -p /etc/quillon
+  echo '{"timeReferences":[{"id":"tr0","uds":"/var/run/ptp4l"}]}' | sandbox_write /etc/quillon/tr.json
+  echo "KOPDM_PTP4L_CONFIG=/etc/quillon/tr.json" | sandbox_inside tee -a /etc/default/ws-runtime > /dev/null
   local started
   started=$(date +%s%N)
-  inside systemctl restart ws-runtime.service
+  sandbox_inside systemctl restart ws-runtime.service
   wait_for 20 "a live listing that names the master" \
     answers "200 *\"success\":true*$MASTER_ID*" GET /quillon/resources
   echo "restart to first live answer: $(( ($(date +%s%N) - started) / 1000000 )) ms"
@@ -310,11 +189,11 @@ requirements_survive() {
     answer=$(http PUT "$DEVICE" "$body")
     [[ "$answer" == 200* ]] || fail "PUT $body: $answer"
     local before
-    before=$(inside systemctl show -P MainPID ws-runtime.service)
+    before=$(sandbox_inside systemctl show -P MainPID ws-runtime.service)
     if [ "$round" = restart ]; then
-      inside systemctl restart ws-runtime.service
+      sandbox_inside systemctl restart ws-runtime.service
     else
-      inside systemctl kill -s KILL ws-runtime.service
+      sandbox_inside systemctl kill -s KILL ws-runtime.service
       wait_for 20 "the unit's restart after SIGKILL" restarted "$before"
     fi
     wait_for 20 "the requirements after $round" \
@@ -325,24 +204,24 @@ requirements_survive() {
 
 restarted() {
   local pid
-  pid=$(inside systemctl show -P MainPID ws-runtime.service)
+  pid=$(sandbox_inside systemctl show -P MainPID ws-runtime.service)
   [ "$pid" != 0 ] && [ "$pid" != "$1" ]
 }
 
 stop_and_purge() {
   step "stop, then purge"
-  inside systemctl stop ws-runtime.service
+  sandbox_inside systemctl stop ws-runtime.service
   local result
-  result=$(inside systemctl show -P Result ws-runtime.service)
+  result=$(sandbox_inside systemctl show -P Result ws-runtime.service)
   [ "$result" = success ] || fail "systemctl stop ended with result $result"
   echo "stopped with result $result"
-  inside test -d /var/lib/private/ws-runtime || fail "no state directory before the purge"
-  inside dpkg --purge quillon-platform quillon > "$work_dir/purge.log" 2>&1 ||
+  sandbox_inside test -d /var/lib/private/ws-runtime || fail "no state directory before the purge"
+  sandbox_inside dpkg --purge quillon-platform quillon > "$work_dir/purge.log" 2>&1 ||
     { cat "$work_dir/purge.log"; fail "dpkg --purge failed"; }
   local path
   for path in /etc/default/ws-runtime /etc/korvane/share/share.dir /var/lib/private/ws-runtime \
               /var/lib/ws-runtime; do
-    ! inside test -e "$path" || fail "$path is left after the purge"
+    ! sandbox_inside test -e "$path" || fail "$path is left after the purge"
   done
   echo "purged: no conffile and no state left"
 }
@@ -357,7 +236,9 @@ main() {
     fail "no packages in $package_dir"
   trap cleanup EXIT
   trap 'exit 143' TERM INT
-  boot
+  step "booting systemd in new PID, mount and network namespaces over an overlay of /"
+  sandbox_boot "$work_dir/systemd.log" "$package_dir" ||
+    { cat "$work_dir/systemd.log"; fail "systemd did not come up in the sandbox"; }
   install_packages
   serve_simulated
   start_ptp_domain
