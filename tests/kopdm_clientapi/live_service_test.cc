@@ -199,7 +199,8 @@ TEST(LiveTimeService, ABurstCostsOneRoundTripPerDaemonAndDataSet) {
   };
   burst();  // the first contact probes both transports
   EXPECT_EQ(a.requests(ManagementId::kDefaultDataSet), 2);
-  std::this_thread::sleep_for(std::chrono::milliseconds(450));
+  // Past the serving limit, so that the burst waits for its exchange.
+  std::this_thread::sleep_for(std::chrono::milliseconds(1000));
   a.resetCounts();
   b.resetCounts();
   burst();
@@ -210,6 +211,51 @@ TEST(LiveTimeService, ABurstCostsOneRoundTripPerDaemonAndDataSet) {
       EXPECT_EQ(daemon->requests(id), 1);
     }
   }
+}
+
+// A daemon slower than the answers' age: a steady caller costs one exchange
+// per age period counted from the answers' arrival, calls made while one is
+// in flight get the previous answers, and only calls with nothing younger
+// than 950 ms wait, all for the same exchange.
+TEST(LiveTimeService, ASlowDaemonCostsOneExchangePerPeriodAndStallsNobody) {
+  using std::chrono::milliseconds;
+  answers_test::ScratchDir sockets;
+  FakeDaemon daemon(sockets.file("d.sock"), healthyDaemon(kSlave));
+  daemon.setDelay(milliseconds(150));
+  Live live(config(tr("d", daemon.path()), ",\"timeoutMillis\":1000,\"maxAgeMillis\":100"));
+  const auto exchanges = [&] { return daemon.requests(ManagementId::kPortDataSet); };
+  const auto concurrently = [&](const std::string& expected) {
+    std::vector<std::future<Reply>> calls;
+    for (int i = 0; i < 8; ++i) {
+      calls.push_back(std::async(std::launch::async, [&] { return live.attr("d", "portState"); }));
+    }
+    for (auto& call : calls) EXPECT_EQ(call.get().text, "{\"portState\":\"" + expected + "\"}");
+  };
+  concurrently("PTP_SLAVE");  // nothing known: all wait for the first exchange
+  EXPECT_EQ(exchanges(), 1);
+
+  int before = exchanges();
+  for (auto end = std::chrono::steady_clock::now() + milliseconds(1000);
+       std::chrono::steady_clock::now() < end;) {
+    ASSERT_EQ(live.attr("d", "portState").code, 0);
+  }
+  std::this_thread::sleep_for(milliseconds(200));
+  EXPECT_GE(exchanges() - before, 2);
+  EXPECT_LE(exchanges() - before, 5);  // 1000 ms / (150 ms + 100 ms), and the one under way
+
+  std::this_thread::sleep_for(milliseconds(1000));
+  daemon.setScript(healthyDaemon(kMaster));
+  before = exchanges();
+  concurrently("PTP_MASTER");  // nothing recent enough: the new state, from one exchange
+  EXPECT_EQ(exchanges() - before, 1);
+
+  // Answers held past the time-out: a caller that waited would fail.
+  daemon.setDelay(milliseconds(1500));
+  std::this_thread::sleep_for(milliseconds(150));
+  concurrently("PTP_MASTER");
+  std::this_thread::sleep_for(milliseconds(1200));
+  EXPECT_EQ(exchanges() - before, 2);
+  EXPECT_EQ(live.attr("d", "portState").code, -1074100996);
 }
 
 TEST(LiveTimeService, DaemonFailuresNameTheReferenceTheSocketAndTheRequest) {

@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <system_error>
 #include <vector>
 
 namespace kopdmlive {
@@ -119,39 +120,61 @@ DaemonLink::DaemonLink(TrConfig tr, std::chrono::milliseconds timeout,
       clientDirectory_(std::move(clientDirectory)),
       self_(clientIdentity()) {}
 
-std::shared_ptr<const DaemonState> DaemonLink::load() const {
-  std::lock_guard<std::mutex> lock(stateMutex_);
-  return state_;
+// No call runs any more; the refresher still needs mutex_ for its last step.
+DaemonLink::~DaemonLink() {
+  if (refresher_.joinable()) refresher_.join();
 }
 
-void DaemonLink::store(std::shared_ptr<const DaemonState> state) {
-  std::lock_guard<std::mutex> lock(stateMutex_);
-  state_ = std::move(state);
-}
-
+// Counted from the answers' arrival, not from the request: a daemon slower
+// than the age would otherwise be asked again by the very next call, and a
+// burst would cost an exchange per call instead of one.
 bool DaemonLink::fresh(const DaemonState& state, Clock::time_point now) const {
-  return state.reusable && now - state.takenAt < maxAge_;
+  return state.reusable && now - state.answeredAt < maxAge_;
 }
 
 std::shared_ptr<const DaemonState> DaemonLink::state() {
-  std::shared_ptr<const DaemonState> seen = load();
+  std::unique_lock<std::mutex> lock(mutex_);
   const Clock::time_point now = Clock::now();
-  if (seen && fresh(*seen, now)) return seen;
-  std::unique_lock<std::mutex> exchange(exchangeMutex_, std::try_to_lock);
-  if (!exchange.owns_lock()) {
-    // Another thread is asking the daemon right now.
-    if (seen && now - seen->takenAt < kServeLimit) return seen;
-    exchange.lock();
-    std::shared_ptr<const DaemonState> answered = load();
-    // What the other thread learnt, rather than a second wait.
-    if (answered != seen) return answered;
-  } else if (std::shared_ptr<const DaemonState> latest = load();
-             latest != seen && latest && fresh(*latest, Clock::now())) {
-    return latest;
+  if (state_ && fresh(*state_, now)) return state_;
+  const bool recent = state_ && now - state_->takenAt < kServeLimit;
+  if (asking_) {
+    if (recent) return state_;
+    // What that exchange learns, rather than a second one.
+    const uint64_t seen = exchanges_;
+    answered_.wait(lock, [&] { return exchanges_ != seen; });
+    return state_;
   }
+  asking_ = true;
+  // A daemon that could not be reached is asked again by this very call:
+  // its answer (or its absence) comes at once.
+  if (recent && state_->reusable && refreshInBackground()) return state_;
+  lock.unlock();
   std::shared_ptr<const DaemonState> asked = ask();
-  store(asked);
+  lock.lock();
+  finish(asked);
   return asked;
+}
+
+bool DaemonLink::refreshInBackground() {
+  // The previous refresher cleared asking_ as its last step under the lock.
+  if (refresher_.joinable()) refresher_.join();
+  try {
+    refresher_ = std::thread([this] {
+      std::shared_ptr<const DaemonState> asked = ask();
+      std::lock_guard<std::mutex> lock(mutex_);
+      finish(std::move(asked));
+    });
+  } catch (const std::system_error&) {
+    return false;
+  }
+  return true;
+}
+
+void DaemonLink::finish(std::shared_ptr<const DaemonState> asked) {
+  state_ = std::move(asked);
+  asking_ = false;
+  ++exchanges_;
+  answered_.notify_all();
 }
 
 PendingGet DaemonLink::pendingGet(ManagementId id, uint8_t transportSpecific) const {
@@ -169,13 +192,15 @@ std::shared_ptr<const DaemonState> DaemonLink::ask() {
   auto state = std::make_shared<DaemonState>();
   state->takenAt = Clock::now();
   const Clock::time_point deadline = state->takenAt + timeout_;
-  if (!ensureClient(*state)) return state;
-  const bool probe = transportSpecific_ < 0;
-  if (probe && !probeTransport(*state, deadline)) {
-    state->takenAt = Clock::now();
-    return state;
+  if (ensureClient(*state)) {
+    const bool probe = transportSpecific_ < 0;
+    if (!probe || probeTransport(*state, deadline)) {
+      askRest(*state, deadline, probe);
+    } else {
+      state->takenAt = Clock::now();
+    }
   }
-  askRest(*state, deadline, probe);
+  state->answeredAt = Clock::now();
   return state;
 }
 
