@@ -213,6 +213,12 @@ ExchangeOutcome exchange(UdsClient& client, const std::string& serverPath,
     outcome.failure = client.send(serverPath, bytes.data(), bytes.size());
     if (outcome.failure.call != nullptr) return outcome;
   }
+  return collect(client, serverPath, gets, until, deadline);
+}
+
+ExchangeOutcome collect(UdsClient& client, const std::string& serverPath,
+                        std::vector<PendingGet>& gets, Until until, Clock::time_point deadline) {
+  ExchangeOutcome outcome;
   std::vector<uint8_t> datagram(kDatagramCapacity);
   while (!satisfied(gets, until)) {
     datagram.resize(kDatagramCapacity);

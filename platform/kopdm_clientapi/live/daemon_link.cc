@@ -193,10 +193,11 @@ std::shared_ptr<const DaemonState> DaemonLink::ask() {
   state->takenAt = Clock::now();
   const Clock::time_point deadline = state->takenAt + timeout_;
   if (ensureClient(*state)) {
-    const bool probe = transportSpecific_ < 0;
-    if (!probe || probeTransport(*state, deadline)) {
-      askRest(*state, deadline, probe);
-    } else {
+    const Probe probe =
+        transportSpecific_ < 0 ? probeTransport(*state, deadline) : Probe::kNotNeeded;
+    if (probe == Probe::kNotNeeded || probe == Probe::kDefaultsOnly) {
+      askRest(*state, deadline, probe == Probe::kDefaultsOnly);
+    } else if (probe == Probe::kFailed) {
       state->takenAt = Clock::now();
     }
   }
@@ -214,37 +215,72 @@ bool DaemonLink::ensureClient(DaemonState& state) {
   return false;
 }
 
+std::vector<PendingGet> DaemonLink::requests(uint8_t transportSpecific, bool haveDefaults) const {
+  std::vector<PendingGet> gets;
+  DaemonState shape;
+  forEachDataSet(shape, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
+    gets.push_back(pendingGet(DataSet::kId, transportSpecific));
+  });
+  return gets;
+}
+
+// `gets` as `requests` made them.
+void DaemonLink::fill(DaemonState& state, const std::vector<PendingGet>& gets,
+                      const ExchangeOutcome& outcome, bool haveDefaults) const {
+  size_t next = 0;
+  forEachDataSet(state, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
+    fillFromAnswer(fetched, gets[next++], outcome, false);
+  });
+}
+
 // A daemon configured for IEEE 802.1AS answers only requests that carry its
-// transportSpecific, so the first exchange asks both ways at once.
-bool DaemonLink::probeTransport(DaemonState& state, Clock::time_point deadline) {
-  std::vector<PendingGet> gets{pendingGet(ManagementId::kDefaultDataSet, 0),
-                               pendingGet(ManagementId::kDefaultDataSet, 1)};
+// transportSpecific. The first exchange asks every data set with 0, the
+// usual value, and the default data set with 1 as well: one round trip shows
+// which kind the daemon is, and for the usual kind it is the only one. That
+// is eight datagrams, within the ten a daemon's socket queues.
+DaemonLink::Probe DaemonLink::probeTransport(DaemonState& state, Clock::time_point deadline) {
+  std::vector<PendingGet> gets = requests(0, false);
+  gets.push_back(pendingGet(ManagementId::kDefaultDataSet, 1));
   const ExchangeOutcome outcome =
       ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kAnyAnswer, deadline);
   if (outcome.failure.call != nullptr) {
     failSend(state, outcome.failure, true);
-    return false;
+    return Probe::kFailed;
   }
-  const PendingGet& answered = gets[0].answered ? gets[0] : gets[1];
-  if (!answered.answered) {
+  if (!anyAnswered(gets)) {
     failSilent(state, outcome, true);
-    return false;
+    return Probe::kFailed;
   }
-  transportSpecific_ = answered.request.transportSpecific;
-  fillFromAnswer(state.defaults, answered, outcome, true);
-  return true;
+  if (gets.back().answered) {
+    transportSpecific_ = 1;
+    state.transportSpecific = 1;
+    fillFromAnswer(state.defaults, gets.back(), outcome, false);
+    return Probe::kDefaultsOnly;
+  }
+  transportSpecific_ = 0;
+  state.transportSpecific = 0;
+  gets.pop_back();
+  ExchangeOutcome rest =
+      ptpmgmt::collect(*client_, tr_.uds, gets, ptpmgmt::Until::kEveryAnswer, deadline);
+  if (rest.failure.call != nullptr) {
+    failSend(state, rest.failure, false);
+    return Probe::kFailed;
+  }
+  if (rest.unmatchedMalformed == DecodeError::kNone) {
+    rest.unmatchedMalformed = outcome.unmatchedMalformed;
+  }
+  fill(state, gets, rest, false);
+  return Probe::kComplete;
 }
 
 void DaemonLink::askRest(DaemonState& state, Clock::time_point deadline, bool haveDefaults) {
   const uint8_t transportSpecific = static_cast<uint8_t>(transportSpecific_);
   state.transportSpecific = transportSpecific;
-  std::vector<PendingGet> gets;
-  forEachDataSet(state, [&](auto& fetched) {
-    using DataSet = decltype(fetched.value);
-    // The probe already brought the default data set.
-    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
-    gets.push_back(pendingGet(DataSet::kId, transportSpecific));
-  });
+  std::vector<PendingGet> gets = requests(transportSpecific, haveDefaults);
   const ExchangeOutcome outcome =
       ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kEveryAnswer, deadline);
   if (outcome.failure.call != nullptr) {
@@ -259,12 +295,7 @@ void DaemonLink::askRest(DaemonState& state, Clock::time_point deadline, bool ha
     state.takenAt = Clock::now();
     return;
   }
-  size_t next = 0;
-  forEachDataSet(state, [&](auto& fetched) {
-    using DataSet = decltype(fetched.value);
-    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
-    fillFromAnswer(fetched, gets[next++], outcome, false);
-  });
+  fill(state, gets, outcome, haveDefaults);
 }
 
 }  // namespace kopdmlive

@@ -22,6 +22,7 @@
 #include <mutex>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include "live/live_config.h"
 #include "ptp_management/codec.h"
@@ -99,7 +100,17 @@ class DaemonLink {
   // Asks the daemon; only while asking_ is set by this thread's caller.
   std::shared_ptr<const DaemonState> ask();
   bool ensureClient(DaemonState& state);
-  bool probeTransport(DaemonState& state, Clock::time_point deadline);
+  enum class Probe {
+    kNotNeeded,     // the transportSpecific is known
+    kFailed,        // every data set failed
+    kDefaultsOnly,  // an IEEE 802.1AS daemon: the other data sets are still to ask
+    kComplete,      // every data set answered or failed
+  };
+  Probe probeTransport(DaemonState& state, Clock::time_point deadline);
+  // The GETs of every data set, the default one aside when `haveDefaults`.
+  std::vector<ptpmgmt::PendingGet> requests(uint8_t transportSpecific, bool haveDefaults) const;
+  void fill(DaemonState& state, const std::vector<ptpmgmt::PendingGet>& gets,
+            const ptpmgmt::ExchangeOutcome& outcome, bool haveDefaults) const;
   void askRest(DaemonState& state, Clock::time_point deadline, bool haveDefaults);
   ptpmgmt::PendingGet pendingGet(ptpmgmt::ManagementId id, uint8_t transportSpecific) const;
 

@@ -99,6 +99,10 @@ struct ExchangeOutcome {
 ExchangeOutcome exchange(UdsClient& client, const std::string& serverPath,
                          std::vector<PendingGet>& gets, Until until,
                          Clock::time_point deadline);
+// The receiving half of `exchange`, for requests already sent: collects
+// answers until `until` is met or `deadline` passes.
+ExchangeOutcome collect(UdsClient& client, const std::string& serverPath,
+                        std::vector<PendingGet>& gets, Until until, Clock::time_point deadline);
 
 }  // namespace ptpmgmt
 
