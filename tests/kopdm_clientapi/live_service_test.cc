@@ -113,7 +113,7 @@ TEST(LiveTimeService, AnswersComeFromTheDaemonsDataSets) {
   answers_test::ScratchDir sockets;
   FakeDaemon master(sockets.file("m.sock"), healthyDaemon(kMaster));
   FakeDaemon slave(sockets.file("s.sock"), healthyDaemon(kSlave, 0, 1, -815));
-  Live live(config(tr("trM", master.path()) + "," + tr("tr S", slave.path())));
+  Live live(config(tr("trM", master.path()) + "," + tr("tr_S", slave.path())));
   const struct {
     const char* tr;
     const char* key;
@@ -121,13 +121,13 @@ TEST(LiveTimeService, AnswersComeFromTheDaemonsDataSets) {
   } cases[] = {
       {"trM", "type", "{\"type\":\"IEEE 1588-2008\"}"},
       {"trM", "portState", "{\"portState\":\"PTP_MASTER\"}"},
-      {"tr S", "portState", "{\"portState\":\"PTP_SLAVE\"}"},
-      {"tr S", "gmClockId", "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}"},
-      {"tr S", "meanPathDelayNanos", "{\"meanPathDelayNanos\":-0.5}"},
-      {"tr S", "masterOffsetNanos", "{\"masterOffsetNanos\":-815}"},
-      {"tr S", "ptpTimescale", "{\"ptpTimescale\":true}"},
-      {"tr S", "interface", "{\"interface\":\"veth0\"}"},
-      {"tr S", "delayMechanism", "{\"delayMechanism\":\"E2E\"}"},
+      {"tr_S", "portState", "{\"portState\":\"PTP_SLAVE\"}"},
+      {"tr_S", "gmClockId", "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}"},
+      {"tr_S", "meanPathDelayNanos", "{\"meanPathDelayNanos\":-0.5}"},
+      {"tr_S", "masterOffsetNanos", "{\"masterOffsetNanos\":-815}"},
+      {"tr_S", "ptpTimescale", "{\"ptpTimescale\":true}"},
+      {"tr_S", "interface", "{\"interface\":\"veth0\"}"},
+      {"tr_S", "delayMechanism", "{\"delayMechanism\":\"E2E\"}"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(std::string(c.tr) + " " + c.key);
@@ -135,21 +135,21 @@ TEST(LiveTimeService, AnswersComeFromTheDaemonsDataSets) {
     EXPECT_EQ(reply.code, 0) << reply.text;
     EXPECT_EQ(reply.text, c.answer);
   }
-  EXPECT_EQ(live.pdmAttr("timeReferences").text, "{\"timeReferences\":[\"trM\",\"tr S\"]}");
+  EXPECT_EQ(live.pdmAttr("timeReferences").text, "{\"timeReferences\":[\"trM\",\"tr_S\"]}");
   EXPECT_EQ(live.pdmAttr("selection").text, "{\"selection\":\"automatic\"}");
   // The first locked slave in file order; its offset is the device's.
-  EXPECT_EQ(live.selected().text, "selected tr S");
-  EXPECT_EQ(live.pdmAttr("selectedTr").text, "{\"selectedTr\":\"tr S\"}");
+  EXPECT_EQ(live.selected().text, "selected tr_S");
+  EXPECT_EQ(live.pdmAttr("selectedTr").text, "{\"selectedTr\":\"tr_S\"}");
   EXPECT_EQ(live.offset().text, "-815");
 
   // Without a locked slave nothing is selected and no offset is known.
   slave.setScript(healthyDaemon(kUncalibrated));
-  Live unlocked(config(tr("trM", master.path()) + "," + tr("tr S", slave.path())));
+  Live unlocked(config(tr("trM", master.path()) + "," + tr("tr_S", slave.path())));
   EXPECT_EQ(unlocked.selected().code, 0);
   EXPECT_EQ(unlocked.pdmAttr("selectedTr").text, "{\"selectedTr\":null}");
   EXPECT_EQ(unlocked.offset({"message"}).code, -1074101000);
   // A configured selection holds whatever the ports do.
-  Live configured(config(tr("trM", master.path()) + "," + tr("tr S", slave.path()),
+  Live configured(config(tr("trM", master.path()) + "," + tr("tr_S", slave.path()),
                          ",\"selectedTr\":\"trM\""));
   EXPECT_EQ(configured.selected().text, "selected trM");
   EXPECT_EQ(configured.offset().text, "-42");
@@ -383,10 +383,22 @@ TEST(LiveTimeService, CallsThatWouldChangeADaemonAreRefused) {
 }
 
 TEST(LiveConfig, ProblemsSayWhatAndWhere) {
+  // Five ids whose answer takes 1024 bytes, one more than the plug-in reads.
+  const auto fiveIds = [](size_t lastLength) {
+    std::string trs;
+    for (char id = 'a'; id <= 'e'; ++id) {
+      trs += std::string(trs.empty() ? "" : ",") + "{\"id\":\"" +
+             std::string(id == 'e' ? lastLength : 199, id) + "\",\"uds\":\"/s\"}";
+    }
+    return "{\"timeReferences\":[" + trs + "]}";
+  };
   const struct {
-    const char* text;
-    const char* problem;
+    std::string text;
+    std::string problem;
   } cases[] = {
+      {fiveIds(193), "\"timeReferences\" lists more than the plug-in can read: the answer "
+                     "naming them would be 1024 bytes, more than 1023"},
+      {std::string("{\"timeReferences\":[]}\0x", 23), "the text holds a NUL byte at offset 21"},
       {"{", "the text is not valid JSON (syntax error at line 1, column 2)"},
       {"[]", "the configuration must be an object"},
       {"{\"timeReferences\":[],\"timeout\":1}", "unknown member \"timeout\""},
@@ -398,7 +410,20 @@ TEST(LiveConfig, ProblemsSayWhatAndWhere) {
       {"{\"timeReferences\":[{\"id\":\"\",\"uds\":\"/s\"}]}",
        "\"timeReferences\"[0].\"id\" must be a non-empty string"},
       {"{\"timeReferences\":[{\"id\":\"a/b\",\"uds\":\"/s\"}]}",
-       "\"timeReferences\"[0].\"id\" must not contain \"/\" nor be longer than 255 bytes"},
+       "\"timeReferences\"[0].\"id\" holds the byte 0x2F at offset 1: only letters A-Z and "
+       "a-z, digits and \"-._~\" may be used"},
+      {"{\"timeReferences\":[{\"id\":\"a\\\"\",\"uds\":\"/s\"}]}",
+       "\"timeReferences\"[0].\"id\" holds the byte 0x22 at offset 1: only letters A-Z and "
+       "a-z, digits and \"-._~\" may be used"},
+      {"{\"timeReferences\":[{\"id\":\"\xC3\",\"uds\":\"/s\"}]}",
+       "\"timeReferences\"[0].\"id\" holds the byte 0xC3 at offset 0: only letters A-Z and "
+       "a-z, digits and \"-._~\" may be used"},
+      {"{\"timeReferences\":[{\"id\":\"..\",\"uds\":\"/s\"}]}",
+       "\"timeReferences\"[0].\"id\" must not be \".\" or \"..\" nor be longer than 255 bytes"},
+      {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\\u0000x\"}]}",
+       "\"timeReferences\"[0].\"uds\" must not contain NUL (\\u0000)"},
+      {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\"}],\"selectedTr\":\"a\\u0000\"}",
+       "\"selectedTr\" must not contain NUL (\\u0000)"},
       {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\",\"port\":0}]}",
        "\"timeReferences\"[0].\"port\" must be an integer from 1 to 65534"},
       {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\",\"domainNumber\":1.5}]}",
@@ -424,6 +449,7 @@ TEST(LiveConfig, ProblemsSayWhatAndWhere) {
   }
   LiveConfig config;
   std::string problem;
+  EXPECT_TRUE(parseLiveConfig(fiveIds(192), &config, &problem)) << problem;
   ASSERT_TRUE(parseLiveConfig(
       "{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\",\"port\":2,\"domainNumber\":24}],"
       "\"selectedTr\":\"a\",\"timeoutMillis\":50}",
