@@ -6,6 +6,7 @@
 #include <cjson/cJSON.h>
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <fstream>
 #include <functional>
 #include <future>
@@ -322,6 +323,12 @@ TEST(LiveTimeService, DaemonFailuresNameTheReferenceTheSocketAndTheRequest) {
             "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}");
   // A reference whose port state cannot be had is passed over.
   EXPECT_EQ(live.selected().text, "selected garbling");
+  // Every daemon was asked through the one client socket of the process.
+  int clientSockets = 0;
+  for (const auto& entry : std::filesystem::directory_iterator(live.dir.str())) {
+    clientSockets += entry.path().filename().string().rfind("kopdm.", 0) == 0 ? 1 : 0;
+  }
+  EXPECT_EQ(clientSockets, 1);
 }
 
 TEST(LiveTimeService, AStuckDaemonHoldsUpOnlyItsOwnCalls) {

@@ -113,11 +113,12 @@ bool anyAnswered(const std::vector<PendingGet>& gets) {
 }  // namespace
 
 DaemonLink::DaemonLink(TrConfig tr, std::chrono::milliseconds timeout,
-                       std::chrono::milliseconds maxAge, std::string clientDirectory)
+                       std::chrono::milliseconds maxAge,
+                       std::shared_ptr<ptpmgmt::SharedUdsClient> client)
     : tr_(std::move(tr)),
       timeout_(timeout),
       maxAge_(maxAge),
-      clientDirectory_(std::move(clientDirectory)),
+      client_(std::move(client)),
       self_(clientIdentity()) {}
 
 // No call runs any more; the refresher still needs mutex_ for its last step.
@@ -206,10 +207,8 @@ std::shared_ptr<const DaemonState> DaemonLink::ask() {
 }
 
 bool DaemonLink::ensureClient(DaemonState& state) {
-  if (client_) return true;
   ptpmgmt::SystemFailure failure;
-  client_ = ptpmgmt::UdsClient::open(clientDirectory_, &failure);
-  if (client_) return true;
+  if (client_->open(&failure)) return true;
   failAll(state, FailureKind::kUnreachable, failure, DecodeError::kNone, false);
   state.reusable = false;
   return false;
@@ -245,8 +244,12 @@ void DaemonLink::fill(DaemonState& state, const std::vector<PendingGet>& gets,
 DaemonLink::Probe DaemonLink::probeTransport(DaemonState& state, Clock::time_point deadline) {
   std::vector<PendingGet> gets = requests(0, false);
   gets.push_back(pendingGet(ManagementId::kDefaultDataSet, 1));
-  const ExchangeOutcome outcome =
-      ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kAnyAnswer, deadline);
+  ptpmgmt::SharedUdsClient::Exchange exchange(*client_, tr_.uds, gets);
+  if (const ptpmgmt::SystemFailure failure = exchange.send(); failure.call != nullptr) {
+    failSend(state, failure, true);
+    return Probe::kFailed;
+  }
+  const ExchangeOutcome outcome = exchange.collect(ptpmgmt::Until::kAnyAnswer, deadline);
   if (outcome.failure.call != nullptr) {
     failSend(state, outcome.failure, true);
     return Probe::kFailed;
@@ -264,14 +267,11 @@ DaemonLink::Probe DaemonLink::probeTransport(DaemonState& state, Clock::time_poi
   transportSpecific_ = 0;
   state.transportSpecific = 0;
   gets.pop_back();
-  ExchangeOutcome rest =
-      ptpmgmt::collect(*client_, tr_.uds, gets, ptpmgmt::Until::kEveryAnswer, deadline);
+  // The request with 1 stays unanswered: no longer waited for.
+  const ExchangeOutcome rest = exchange.collect(ptpmgmt::Until::kEveryAnswer, deadline);
   if (rest.failure.call != nullptr) {
     failSend(state, rest.failure, false);
     return Probe::kFailed;
-  }
-  if (rest.unmatchedMalformed == DecodeError::kNone) {
-    rest.unmatchedMalformed = outcome.unmatchedMalformed;
   }
   fill(state, gets, rest, false);
   return Probe::kComplete;
@@ -281,8 +281,12 @@ void DaemonLink::askRest(DaemonState& state, Clock::time_point deadline, bool ha
   const uint8_t transportSpecific = static_cast<uint8_t>(transportSpecific_);
   state.transportSpecific = transportSpecific;
   std::vector<PendingGet> gets = requests(transportSpecific, haveDefaults);
-  const ExchangeOutcome outcome =
-      ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kEveryAnswer, deadline);
+  ptpmgmt::SharedUdsClient::Exchange exchange(*client_, tr_.uds, gets);
+  if (const ptpmgmt::SystemFailure failure = exchange.send(); failure.call != nullptr) {
+    failSend(state, failure, false);
+    return;
+  }
+  const ExchangeOutcome outcome = exchange.collect(ptpmgmt::Until::kEveryAnswer, deadline);
   if (outcome.failure.call != nullptr) {
     failSend(state, outcome.failure, false);
     return;

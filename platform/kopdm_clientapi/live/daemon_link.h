@@ -26,7 +26,7 @@
 
 #include "live/live_config.h"
 #include "ptp_management/codec.h"
-#include "ptp_management/uds_client.h"
+#include "ptp_management/shared_uds_client.h"
 
 namespace kopdmlive {
 
@@ -75,8 +75,9 @@ struct DaemonState {
 
 class DaemonLink {
  public:
+  // Exchanges go through `client`, the process's one client socket.
   DaemonLink(TrConfig tr, std::chrono::milliseconds timeout, std::chrono::milliseconds maxAge,
-             std::string clientDirectory);
+             std::shared_ptr<ptpmgmt::SharedUdsClient> client);
   // Waits for an exchange in flight (at most the timeout).
   ~DaemonLink();
   DaemonLink(const DaemonLink&) = delete;
@@ -117,11 +118,10 @@ class DaemonLink {
   const TrConfig tr_;
   const std::chrono::milliseconds timeout_;
   const std::chrono::milliseconds maxAge_;
-  const std::string clientDirectory_;
+  const std::shared_ptr<ptpmgmt::SharedUdsClient> client_;
   const ptpmgmt::PortIdentity self_;
 
-  // Used only by the one thread that asks (asking_ hands them over).
-  std::unique_ptr<ptpmgmt::UdsClient> client_;
+  // Used only by the one thread that asks (asking_ hands it over).
   int transportSpecific_ = -1;  // -1: unknown
 
   std::mutex mutex_;
