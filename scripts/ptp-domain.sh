@@ -23,7 +23,7 @@
 # owners that no longer run. Needs root, iproute2 and linuxptp.
 set -euo pipefail
 
-usage() { sed -n '2,25p' "$0" >&2; exit 2; }
+usage() { sed -n '2,23p' "$0" >&2; exit 2; }
 
 role_namespace() {  # DIR ROLE
   local prefix

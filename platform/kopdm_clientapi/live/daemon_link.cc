@@ -150,7 +150,15 @@ std::shared_ptr<const DaemonState> DaemonLink::state() {
   // its answer (or its absence) comes at once.
   if (recent && state_->reusable && refreshInBackground()) return state_;
   lock.unlock();
-  std::shared_ptr<const DaemonState> asked = ask();
+  std::shared_ptr<const DaemonState> asked;
+  try {
+    asked = ask();
+  } catch (...) {
+    // Out of memory: the waiters must not wait for an exchange that ended.
+    lock.lock();
+    finish(nullptr);
+    throw;
+  }
   lock.lock();
   finish(asked);
   return asked;
@@ -161,7 +169,12 @@ bool DaemonLink::refreshInBackground() {
   if (refresher_.joinable()) refresher_.join();
   try {
     refresher_ = std::thread([this] {
-      std::shared_ptr<const DaemonState> asked = ask();
+      std::shared_ptr<const DaemonState> asked;
+      try {
+        asked = ask();
+      } catch (...) {
+        // Out of memory: the previous answers stay, until they are too old.
+      }
       std::lock_guard<std::mutex> lock(mutex_);
       finish(std::move(asked));
     });
@@ -172,7 +185,7 @@ bool DaemonLink::refreshInBackground() {
 }
 
 void DaemonLink::finish(std::shared_ptr<const DaemonState> asked) {
-  state_ = std::move(asked);
+  if (asked) state_ = std::move(asked);
   asking_ = false;
   ++exchanges_;
   answered_.notify_all();

@@ -96,7 +96,8 @@ class DaemonLink {
   // Starts an exchange on a thread of its own; false when no thread could
   // be made. mutex_ held, asking_ set.
   bool refreshInBackground();
-  // Ends the exchange in flight with what it learnt; mutex_ held.
+  // Ends the exchange in flight with what it learnt (null: nothing, the
+  // previous state stays); mutex_ held.
   void finish(std::shared_ptr<const DaemonState> asked);
   // Asks the daemon; only while asking_ is set by this thread's caller.
   std::shared_ptr<const DaemonState> ask();
