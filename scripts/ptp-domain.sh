@@ -16,9 +16,11 @@
 #
 # `up` also writes DIR/tr.json, the live time service's configuration for the
 # domain: time reference tr0 is the master, tr1 the slave.
-# PREFIX is "qptp" followed by the pid of the process that owns the domain
-# (at most 11 characters, so that interface names fit); `sweep` removes the
-# domains of owners that no longer run. Needs root, iproute2 and linuxptp.
+# PREFIX is "qptp" followed by the pid of the process that owns the domain,
+# optionally with a tag of digits after the "q" (e.g. "q7ptp1234", so that
+# runs of several checkouts tell their namespaces apart), at most 14
+# characters so that interface names fit; `sweep` removes the domains of
+# owners that no longer run. Needs root, iproute2 and linuxptp.
 set -euo pipefail
 
 usage() { sed -n '2,23p' "$0" >&2; exit 2; }
@@ -103,8 +105,9 @@ remove_namespace() {  # NAME
 domain_up() {  # DIR PREFIX
   local dir=$1 prefix=$2
   case "$prefix" in
-    qptp[0-9]*) [ ${#prefix} -le 11 ] || { echo "ptp-domain: prefix too long" >&2; exit 2; } ;;
-    *) echo "ptp-domain: the prefix must be qptp<pid>" >&2; exit 2 ;;
+    q*ptp[0-9]*) [[ "$prefix" =~ ^q[0-9]*ptp[0-9]+$ && ${#prefix} -le 14 ]] ||
+                   { echo "ptp-domain: the prefix must be q[TAG]ptp<pid>, 14 characters at most" >&2; exit 2; } ;;
+    *) echo "ptp-domain: the prefix must be q[TAG]ptp<pid>" >&2; exit 2 ;;
   esac
   mkdir -p "$dir"
   echo "$prefix" > "$dir/prefix"
@@ -140,7 +143,7 @@ domain_down() {  # DIR
 sweep() {
   local name owner
   for name in $(ip netns list 2>/dev/null | awk '{print $1}'); do
-    [[ "$name" =~ ^qptp([0-9]+)[ms]$ ]] || continue
+    [[ "$name" =~ ^q[0-9]*ptp([0-9]+)[ms]$ ]] || continue
     owner=${BASH_REMATCH[1]}
     kill -0 "$owner" 2>/dev/null && continue
     remove_namespace "$name"

@@ -16,6 +16,11 @@ namespace {
 // How long a file that does not read well must stay as read before it is
 // served as unusable.
 constexpr std::chrono::milliseconds kBrokenFileSettling{50};
+// How often, and for how long at most, a verdict held back because a
+// program has the file open is sought again: a program may keep it open
+// without ever writing it (a pager, tail -f).
+constexpr std::chrono::milliseconds kHeldBackRetry{100};
+constexpr std::chrono::milliseconds kHeldOpenLimit{1000};
 
 // Writes in place are watched too (IN_MODIFY, truncation included), only to
 // know that the file is incomplete until its writer closes it; openings and
@@ -36,16 +41,42 @@ std::string nameOf(const std::string& path) {
 
 }  // namespace
 
-bool ScenarioWatch::Settling::keep(bool readWell,
-                                   const std::function<bool()>& sameAsRead) const {
+bool ScenarioWatch::unchanged() { return !drainEvents() && !writing_ && !pending_; }
+
+bool ScenarioWatch::settle(bool readWell, const std::function<bool()>& sameAsRead) {
   if (!sameAsRead() || !unchanged()) return false;
-  if (readWell) return true;
+  // A rename puts a whole file in place: there is no write to wait for.
+  if (readWell || replaced_) return true;
   // The kernel reports a truncation a moment after it happened: a file read
   // empty or cut short that a program still has open, or that changes
-  // within a moment, is left to the report of its close.
-  if (!closedEverywhere()) return false;
+  // within a moment, may be a write just begun.
+  const auto heldTooLong = [this] {
+    return heldSince_ && Clock::now() - *heldSince_ >= kHeldOpenLimit;
+  };
+  if (opened_ > 0 && !heldTooLong()) {
+    holdBack();
+    return false;
+  }
   std::this_thread::sleep_for(kBrokenFileSettling);
-  return sameAsRead() && unchanged() && closedEverywhere();
+  if (!sameAsRead() || !unchanged()) return false;
+  if (opened_ > 0 && !heldTooLong()) {
+    holdBack();
+    return false;
+  }
+  heldSince_.reset();
+  return true;
+}
+
+void ScenarioWatch::holdBack() {
+  heldBack_ = true;
+  if (!heldSince_) heldSince_ = Clock::now();
+  retryAt_ = Clock::now() + kHeldBackRetry;
+}
+
+int ScenarioWatch::msUntilRetry() const {
+  if (!retryAt_) return -1;
+  const auto left = std::chrono::ceil<std::chrono::milliseconds>(*retryAt_ - Clock::now());
+  return left.count() < 0 ? 0 : static_cast<int>(left.count());
 }
 
 ScenarioWatch::ScenarioWatch(const std::string& path, OnChange onChange)
@@ -74,20 +105,27 @@ ScenarioWatch::~ScenarioWatch() {
 }
 
 void ScenarioWatch::run() {
-  const Settling settling{[this] { return !drainEvents() && !writing_ && !pending_; },
-                          [this] { return opened_ == 0; }};
+  const Settling settling(*this);
   for (;;) {
     pollfd fds[2] = {{inotifyFd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
-    if (poll(fds, 2, -1) < 0) {
+    if (poll(fds, 2, msUntilRetry()) < 0) {
       if (errno == EINTR) continue;
       return;
     }
     if (fds[1].revents != 0) return;
     drainEvents();
+    if (retryAt_ && Clock::now() >= *retryAt_) {
+      retryAt_.reset();
+      pending_ = true;
+    }
     // What happened while the callback read the file is in the flags by
     // now, so a dropped read is followed by another once the file settles.
     while (pending_ && !writing_) {
       pending_ = false;
+      // The callback's own opening and closing of the file must not count
+      // as the close that a held-back verdict waits for.
+      heldBack_ = false;
+      retryAt_.reset();
       onChange_(settling);
     }
   }
@@ -109,22 +147,36 @@ bool ScenarioWatch::drainEvents() {
   }
 }
 
+bool ScenarioWatch::closed() {
+  if (opened_ > 0) --opened_;
+  if (opened_ > 0 || (!heldBack_ && !writing_)) return false;
+  writing_ = false;
+  pending_ = true;
+  return true;
+}
+
 bool ScenarioWatch::apply(uint32_t mask) {
   if ((mask & IN_OPEN) != 0) {
     ++opened_;
     return false;
   }
-  if ((mask & IN_CLOSE_NOWRITE) != 0) {
-    // A close of an opening made before the watch began is not counted.
-    if (opened_ > 0) --opened_;
-    return false;
-  }
+  // A close of an opening made before the watch began is not counted.
+  if ((mask & IN_CLOSE_NOWRITE) != 0) return closed();
+  replaced_ = false;
+  heldSince_.reset();
   if ((mask & IN_MODIFY) != 0) {
-    writing_ = true;
+    // With no opening seen, the change was made by path (truncate) or by a
+    // program that opened the file before the watch began: no close of a
+    // writer will follow to wait for.
+    if (opened_ > 0) {
+      writing_ = true;
+    } else {
+      pending_ = true;
+    }
     return true;
   }
   if ((mask & IN_CLOSE_WRITE) != 0) {
-    if (opened_ > 0) --opened_;
+    closed();
     writing_ = false;
   }
   // A rename or a removal puts another file (or none) under the name, and a
@@ -133,6 +185,7 @@ bool ScenarioWatch::apply(uint32_t mask) {
   if ((mask & (IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_Q_OVERFLOW)) != 0) {
     writing_ = false;
     opened_ = 0;
+    replaced_ = (mask & IN_MOVED_TO) != 0;
   }
   pending_ = true;
   return true;

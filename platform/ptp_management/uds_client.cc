@@ -2,7 +2,6 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <poll.h>
 #include <signal.h>
 #include <sys/socket.h>
 #include <sys/un.h>
@@ -17,9 +16,6 @@ namespace ptpmgmt {
 namespace {
 
 constexpr const char* kNamePrefix = "kopdm.";
-// Larger than any management answer ptp4l sends (the longest carries a
-// 255-byte interface name), so a cut datagram is a malformed one.
-constexpr size_t kDatagramCapacity = 1024;
 
 std::atomic<uint32_t> nextClientNumber{0};
 
@@ -55,57 +51,6 @@ void sweepStalePaths(const std::string& directory) {
     ::unlinkat(::dirfd(dir), entry->d_name, 0);
   }
   ::closedir(dir);
-}
-
-uint16_t sequenceCounter() {
-  static std::atomic<uint16_t> next{static_cast<uint16_t>(::getpid())};
-  return next.fetch_add(1, std::memory_order_relaxed);
-}
-
-bool matches(const PendingGet& get, const Answer& answer) {
-  return !get.answered && answer.sequenceId == get.request.sequenceId &&
-         answer.transportSpecific == get.request.transportSpecific &&
-         answer.action == static_cast<uint8_t>(Action::kResponse) &&
-         answer.managementId == static_cast<uint16_t>(get.request.id) &&
-         answer.target == get.request.source;
-}
-
-// Files the datagram under the request it answers; false when it answers none.
-bool file(std::vector<PendingGet>& gets, std::vector<uint8_t>& datagram, ExchangeOutcome* outcome) {
-  Answer answer;
-  const DecodeError error = decodeAnswer(datagram.data(), datagram.size(), &answer);
-  if (error == DecodeError::kNone) {
-    for (PendingGet& get : gets) {
-      if (!matches(get, answer)) continue;
-      get.answered = true;
-      get.datagram.swap(datagram);
-      // Decoded again over the bytes' final home, so that `data` points there.
-      (void)decodeAnswer(get.datagram.data(), get.datagram.size(), &get.answer);
-      return true;
-    }
-    return false;
-  }
-  // Too broken to trust its identifiers, but it may still carry the
-  // sequence id of a request (bytes 30-31), which then failed.
-  constexpr size_t kSequenceEnd = 32;
-  if (datagram.size() >= kSequenceEnd) {
-    const uint16_t sequenceId = static_cast<uint16_t>((datagram[30] << 8) | datagram[31]);
-    for (PendingGet& get : gets) {
-      if (get.answered || get.request.sequenceId != sequenceId) continue;
-      get.answered = true;
-      get.malformed = error;
-      return true;
-    }
-  }
-  outcome->unmatchedMalformed = error;
-  return false;
-}
-
-bool satisfied(const std::vector<PendingGet>& gets, Until until) {
-  for (const PendingGet& get : gets) {
-    if (get.answered == (until == Until::kAnyAnswer)) return until == Until::kAnyAnswer;
-  }
-  return until == Until::kEveryAnswer;
 }
 
 }  // namespace
@@ -184,77 +129,25 @@ SystemFailure UdsClient::send(const std::string& serverPath, const uint8_t* byte
   return {};
 }
 
-ssize_t UdsClient::receive(const std::string& serverPath, uint8_t* buffer, size_t capacity,
-                           Clock::time_point deadline, SystemFailure* failure) {
+ssize_t UdsClient::receiveQueued(uint8_t* buffer, size_t capacity, std::string* from,
+                                 SystemFailure* failure) {
   for (;;) {
-    const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
-        deadline - Clock::now() + std::chrono::microseconds(999));
-    if (left.count() <= 0) return 0;
-    pollfd ready{fd_, POLLIN, 0};
-    const int polled = ::poll(&ready, 1, static_cast<int>(left.count()));
-    if (polled < 0) {
-      if (errno == EINTR) continue;
-      *failure = {"poll", errno};
-      return -1;
-    }
-    if (polled == 0) continue;  // the loop's first check ends it
-    sockaddr_un from;
-    socklen_t fromLength = sizeof from;
+    sockaddr_un address;
+    socklen_t length = sizeof address;
     const ssize_t size = ::recvfrom(fd_, buffer, capacity, MSG_TRUNC | MSG_DONTWAIT,
-                                    reinterpret_cast<sockaddr*>(&from), &fromLength);
+                                    reinterpret_cast<sockaddr*>(&address), &length);
     if (size < 0) {
-      if (errno == EINTR || errno == EAGAIN) continue;
-      *failure = {"recvfrom", errno};
+      if (errno == EINTR) continue;
+      *failure = errno == EAGAIN || errno == EWOULDBLOCK ? SystemFailure{}
+                                                         : SystemFailure{"recvfrom", errno};
       return -1;
     }
-    const size_t pathLength = fromLength > offsetof(sockaddr_un, sun_path)
-                                  ? fromLength - offsetof(sockaddr_un, sun_path)
+    const size_t pathLength = length > offsetof(sockaddr_un, sun_path)
+                                  ? length - offsetof(sockaddr_un, sun_path)
                                   : 0;
-    // The daemon's answers come from its own socket; anything else is a stray.
-    if (pathLength >= serverPath.size() &&
-        std::memcmp(from.sun_path, serverPath.data(), serverPath.size()) == 0 &&
-        (pathLength == serverPath.size() || from.sun_path[serverPath.size()] == '\0')) {
-      return size;
-    }
+    from->assign(address.sun_path, ::strnlen(address.sun_path, pathLength));
+    return size;
   }
-}
-
-void UdsClient::drain() {
-  uint8_t discard[1];
-  while (::recv(fd_, discard, sizeof discard, MSG_DONTWAIT | MSG_TRUNC) >= 0) {
-  }
-}
-
-ExchangeOutcome exchange(UdsClient& client, const std::string& serverPath,
-                         std::vector<PendingGet>& gets, Until until,
-                         Clock::time_point deadline) {
-  ExchangeOutcome outcome;
-  client.drain();
-  for (PendingGet& get : gets) {
-    get.request.sequenceId = sequenceCounter();
-    const auto bytes = encodeGet(get.request);
-    outcome.failure = client.send(serverPath, bytes.data(), bytes.size());
-    if (outcome.failure.call != nullptr) return outcome;
-  }
-  std::vector<uint8_t> datagram(kDatagramCapacity);
-  while (!satisfied(gets, until)) {
-    datagram.resize(kDatagramCapacity);
-    const ssize_t size =
-        client.receive(serverPath, datagram.data(), datagram.size(), deadline, &outcome.failure);
-    if (size < 0) return outcome;
-    if (size == 0) {
-      outcome.timedOut = true;
-      return outcome;
-    }
-    if (static_cast<size_t>(size) > kDatagramCapacity) {
-      outcome.unmatchedMalformed = DecodeError::kLengthBeyondDatagram;
-      continue;
-    }
-    datagram.resize(static_cast<size_t>(size));
-    // A filed datagram was moved to its request.
-    if (file(gets, datagram, &outcome)) datagram.assign(kDatagramCapacity, 0);
-  }
-  return outcome;
 }
 
 }  // namespace ptpmgmt

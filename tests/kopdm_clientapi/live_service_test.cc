@@ -6,6 +6,7 @@
 #include <cjson/cJSON.h>
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <fstream>
 #include <functional>
 #include <future>
@@ -113,7 +114,7 @@ TEST(LiveTimeService, AnswersComeFromTheDaemonsDataSets) {
   answers_test::ScratchDir sockets;
   FakeDaemon master(sockets.file("m.sock"), healthyDaemon(kMaster));
   FakeDaemon slave(sockets.file("s.sock"), healthyDaemon(kSlave, 0, 1, -815));
-  Live live(config(tr("trM", master.path()) + "," + tr("tr S", slave.path())));
+  Live live(config(tr("trM", master.path()) + "," + tr("tr_S", slave.path())));
   const struct {
     const char* tr;
     const char* key;
@@ -121,13 +122,13 @@ TEST(LiveTimeService, AnswersComeFromTheDaemonsDataSets) {
   } cases[] = {
       {"trM", "type", "{\"type\":\"IEEE 1588-2008\"}"},
       {"trM", "portState", "{\"portState\":\"PTP_MASTER\"}"},
-      {"tr S", "portState", "{\"portState\":\"PTP_SLAVE\"}"},
-      {"tr S", "gmClockId", "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}"},
-      {"tr S", "meanPathDelayNanos", "{\"meanPathDelayNanos\":-0.5}"},
-      {"tr S", "masterOffsetNanos", "{\"masterOffsetNanos\":-815}"},
-      {"tr S", "ptpTimescale", "{\"ptpTimescale\":true}"},
-      {"tr S", "interface", "{\"interface\":\"veth0\"}"},
-      {"tr S", "delayMechanism", "{\"delayMechanism\":\"E2E\"}"},
+      {"tr_S", "portState", "{\"portState\":\"PTP_SLAVE\"}"},
+      {"tr_S", "gmClockId", "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}"},
+      {"tr_S", "meanPathDelayNanos", "{\"meanPathDelayNanos\":-0.5}"},
+      {"tr_S", "masterOffsetNanos", "{\"masterOffsetNanos\":-815}"},
+      {"tr_S", "ptpTimescale", "{\"ptpTimescale\":true}"},
+      {"tr_S", "interface", "{\"interface\":\"veth0\"}"},
+      {"tr_S", "delayMechanism", "{\"delayMechanism\":\"E2E\"}"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(std::string(c.tr) + " " + c.key);
@@ -135,21 +136,21 @@ TEST(LiveTimeService, AnswersComeFromTheDaemonsDataSets) {
     EXPECT_EQ(reply.code, 0) << reply.text;
     EXPECT_EQ(reply.text, c.answer);
   }
-  EXPECT_EQ(live.pdmAttr("timeReferences").text, "{\"timeReferences\":[\"trM\",\"tr S\"]}");
+  EXPECT_EQ(live.pdmAttr("timeReferences").text, "{\"timeReferences\":[\"trM\",\"tr_S\"]}");
   EXPECT_EQ(live.pdmAttr("selection").text, "{\"selection\":\"automatic\"}");
   // The first locked slave in file order; its offset is the device's.
-  EXPECT_EQ(live.selected().text, "selected tr S");
-  EXPECT_EQ(live.pdmAttr("selectedTr").text, "{\"selectedTr\":\"tr S\"}");
+  EXPECT_EQ(live.selected().text, "selected tr_S");
+  EXPECT_EQ(live.pdmAttr("selectedTr").text, "{\"selectedTr\":\"tr_S\"}");
   EXPECT_EQ(live.offset().text, "-815");
 
   // Without a locked slave nothing is selected and no offset is known.
   slave.setScript(healthyDaemon(kUncalibrated));
-  Live unlocked(config(tr("trM", master.path()) + "," + tr("tr S", slave.path())));
+  Live unlocked(config(tr("trM", master.path()) + "," + tr("tr_S", slave.path())));
   EXPECT_EQ(unlocked.selected().code, 0);
   EXPECT_EQ(unlocked.pdmAttr("selectedTr").text, "{\"selectedTr\":null}");
   EXPECT_EQ(unlocked.offset({"message"}).code, -1074101000);
   // A configured selection holds whatever the ports do.
-  Live configured(config(tr("trM", master.path()) + "," + tr("tr S", slave.path()),
+  Live configured(config(tr("trM", master.path()) + "," + tr("tr_S", slave.path()),
                          ",\"selectedTr\":\"trM\""));
   EXPECT_EQ(configured.selected().text, "selected trM");
   EXPECT_EQ(configured.offset().text, "-42");
@@ -199,7 +200,8 @@ TEST(LiveTimeService, ABurstCostsOneRoundTripPerDaemonAndDataSet) {
   };
   burst();  // the first contact probes both transports
   EXPECT_EQ(a.requests(ManagementId::kDefaultDataSet), 2);
-  std::this_thread::sleep_for(std::chrono::milliseconds(450));
+  // Past the serving limit, so that the burst waits for its exchange.
+  std::this_thread::sleep_for(std::chrono::milliseconds(1000));
   a.resetCounts();
   b.resetCounts();
   burst();
@@ -210,6 +212,52 @@ TEST(LiveTimeService, ABurstCostsOneRoundTripPerDaemonAndDataSet) {
       EXPECT_EQ(daemon->requests(id), 1);
     }
   }
+}
+
+// A daemon slower than the answers' age: a steady caller costs one exchange
+// per age period counted from the answers' arrival, calls made while one is
+// in flight get the previous answers, and only calls with nothing younger
+// than 950 ms wait, all for the same exchange. Even the first exchange, which
+// finds out the daemon's transportSpecific, is one round trip.
+TEST(LiveTimeService, ASlowDaemonCostsOneExchangePerPeriodAndStallsNobody) {
+  using std::chrono::milliseconds;
+  answers_test::ScratchDir sockets;
+  FakeDaemon daemon(sockets.file("d.sock"), healthyDaemon(kSlave));
+  daemon.setDelay(milliseconds(200));
+  Live live(config(tr("d", daemon.path()), ",\"timeoutMillis\":350,\"maxAgeMillis\":100"));
+  const auto exchanges = [&] { return daemon.requests(ManagementId::kPortDataSet); };
+  const auto concurrently = [&](const std::string& expected) {
+    std::vector<std::future<Reply>> calls;
+    for (int i = 0; i < 8; ++i) {
+      calls.push_back(std::async(std::launch::async, [&] { return live.attr("d", "portState"); }));
+    }
+    for (auto& call : calls) EXPECT_EQ(call.get().text, "{\"portState\":\"" + expected + "\"}");
+  };
+  concurrently("PTP_SLAVE");  // nothing known: all wait for the first exchange
+  EXPECT_EQ(exchanges(), 1);
+
+  int before = exchanges();
+  for (auto end = std::chrono::steady_clock::now() + milliseconds(1000);
+       std::chrono::steady_clock::now() < end;) {
+    ASSERT_EQ(live.attr("d", "portState").code, 0);
+  }
+  std::this_thread::sleep_for(milliseconds(200));
+  EXPECT_GE(exchanges() - before, 2);
+  EXPECT_LE(exchanges() - before, 4);  // 1000 ms / (200 ms + 100 ms), and the one under way
+
+  std::this_thread::sleep_for(milliseconds(1000));
+  daemon.setScript(healthyDaemon(kMaster));
+  before = exchanges();
+  concurrently("PTP_MASTER");  // nothing recent enough: the new state, from one exchange
+  EXPECT_EQ(exchanges() - before, 1);
+
+  // Answers held past the time-out: a caller that waited would fail.
+  daemon.setDelay(milliseconds(1500));
+  std::this_thread::sleep_for(milliseconds(150));
+  concurrently("PTP_MASTER");
+  std::this_thread::sleep_for(milliseconds(1200));
+  EXPECT_EQ(exchanges() - before, 2);
+  EXPECT_EQ(live.attr("d", "portState").code, -1074100996);
 }
 
 TEST(LiveTimeService, DaemonFailuresNameTheReferenceTheSocketAndTheRequest) {
@@ -275,6 +323,12 @@ TEST(LiveTimeService, DaemonFailuresNameTheReferenceTheSocketAndTheRequest) {
             "{\"gmClockId\":\"02-00-00-FF-FE-00-00-09\"}");
   // A reference whose port state cannot be had is passed over.
   EXPECT_EQ(live.selected().text, "selected garbling");
+  // Every daemon was asked through the one client socket of the process.
+  int clientSockets = 0;
+  for (const auto& entry : std::filesystem::directory_iterator(live.dir.str())) {
+    clientSockets += entry.path().filename().string().rfind("kopdm.", 0) == 0 ? 1 : 0;
+  }
+  EXPECT_EQ(clientSockets, 1);
 }
 
 TEST(LiveTimeService, AStuckDaemonHoldsUpOnlyItsOwnCalls) {
@@ -336,10 +390,22 @@ TEST(LiveTimeService, CallsThatWouldChangeADaemonAreRefused) {
 }
 
 TEST(LiveConfig, ProblemsSayWhatAndWhere) {
+  // Five ids whose answer takes 1024 bytes, one more than the plug-in reads.
+  const auto fiveIds = [](size_t lastLength) {
+    std::string trs;
+    for (char id = 'a'; id <= 'e'; ++id) {
+      trs += std::string(trs.empty() ? "" : ",") + "{\"id\":\"" +
+             std::string(id == 'e' ? lastLength : 199, id) + "\",\"uds\":\"/s\"}";
+    }
+    return "{\"timeReferences\":[" + trs + "]}";
+  };
   const struct {
-    const char* text;
-    const char* problem;
+    std::string text;
+    std::string problem;
   } cases[] = {
+      {fiveIds(193), "\"timeReferences\" lists more than the plug-in can read: the answer "
+                     "naming them would be 1024 bytes, more than 1023"},
+      {std::string("{\"timeReferences\":[]}\0x", 23), "the text holds a NUL byte at offset 21"},
       {"{", "the text is not valid JSON (syntax error at line 1, column 2)"},
       {"[]", "the configuration must be an object"},
       {"{\"timeReferences\":[],\"timeout\":1}", "unknown member \"timeout\""},
@@ -351,7 +417,20 @@ TEST(LiveConfig, ProblemsSayWhatAndWhere) {
       {"{\"timeReferences\":[{\"id\":\"\",\"uds\":\"/s\"}]}",
        "\"timeReferences\"[0].\"id\" must be a non-empty string"},
       {"{\"timeReferences\":[{\"id\":\"a/b\",\"uds\":\"/s\"}]}",
-       "\"timeReferences\"[0].\"id\" must not contain \"/\" nor be longer than 255 bytes"},
+       "\"timeReferences\"[0].\"id\" holds the byte 0x2F at offset 1: only letters A-Z and "
+       "a-z, digits and \"-._~\" may be used"},
+      {"{\"timeReferences\":[{\"id\":\"a\\\"\",\"uds\":\"/s\"}]}",
+       "\"timeReferences\"[0].\"id\" holds the byte 0x22 at offset 1: only letters A-Z and "
+       "a-z, digits and \"-._~\" may be used"},
+      {"{\"timeReferences\":[{\"id\":\"\xC3\",\"uds\":\"/s\"}]}",
+       "\"timeReferences\"[0].\"id\" holds the byte 0xC3 at offset 0: only letters A-Z and "
+       "a-z, digits and \"-._~\" may be used"},
+      {"{\"timeReferences\":[{\"id\":\"..\",\"uds\":\"/s\"}]}",
+       "\"timeReferences\"[0].\"id\" must not be \".\" or \"..\" nor be longer than 255 bytes"},
+      {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\\u0000x\"}]}",
+       "\"timeReferences\"[0].\"uds\" must not contain NUL (\\u0000)"},
+      {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\"}],\"selectedTr\":\"a\\u0000\"}",
+       "\"selectedTr\" must not contain NUL (\\u0000)"},
       {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\",\"port\":0}]}",
        "\"timeReferences\"[0].\"port\" must be an integer from 1 to 65534"},
       {"{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\",\"domainNumber\":1.5}]}",
@@ -377,6 +456,7 @@ TEST(LiveConfig, ProblemsSayWhatAndWhere) {
   }
   LiveConfig config;
   std::string problem;
+  EXPECT_TRUE(parseLiveConfig(fiveIds(192), &config, &problem)) << problem;
   ASSERT_TRUE(parseLiveConfig(
       "{\"timeReferences\":[{\"id\":\"a\",\"uds\":\"/s\",\"port\":2,\"domainNumber\":24}],"
       "\"selectedTr\":\"a\",\"timeoutMillis\":50}",

@@ -1,6 +1,7 @@
 // The stand-in's scenario file rewritten while calls read it: written in
 // place in several pieces, or renamed over. No call may ever see a
-// half-written file, and the last version written is the one served.
+// half-written file, and the last version written is the one served,
+// whatever other programs hold the file open meanwhile.
 #include <fcntl.h>
 #include <stdlib.h>
 #include <unistd.h>
@@ -11,6 +12,7 @@
 #include <cstdlib>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -96,6 +98,55 @@ TEST(ScenarioRewrite, ReadersNeverSeeAHalfWrittenFile) {
     EXPECT_EQ(selected(), "tr" + std::to_string(kRewrites));
     writeInPlace(kScenario, scenarioSelecting(0));
   }
+}
+
+std::string waitForServed(const std::string& expected) {
+  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
+  while (selected() != expected && std::chrono::steady_clock::now() < deadline) {
+    std::this_thread::sleep_for(std::chrono::milliseconds(2));
+  }
+  return selected();
+}
+
+// Steps of a reader and a writer on the file, in every order: the writer
+// truncates and writes the new text in place, or a complete file is renamed
+// over it; the reader opens it before, during or after, and closes it
+// before, after or never. Once the writer is done, the new text or its
+// unusability is served, within the watch's bounded wait.
+TEST(ScenarioRewrite, EveryOrderOfOpensWritesClosesAndRenamesEndsInTheFilesVerdict) {
+  const std::string invalid = "{\"apiVersion\":1,\"trs\":";
+  const char* const orders[] = {
+      "R W w c r", "R W w r c", "W R w c r", "W R w r c", "W w R c r", "W w R r c",
+      "W w c R r", "R r W w c", "R W w c",   "R m r",     "m",         "R m",
+  };
+  int version = 0;
+  for (const char* order : orders) {
+    for (const bool valid : {true, false}) {
+      SCOPED_TRACE(std::string(order) + (valid ? ", valid" : ", invalid"));
+      replaceByRename(kScenario, scenarioSelecting(0));
+      ASSERT_EQ(waitForServed("tr0"), "tr0");
+      const std::string text = valid ? scenarioSelecting(++version) : invalid;
+      const std::string staged = kScenario + ".staged";
+      if (std::string(order).find('m') != std::string::npos) writeInPlace(staged, text);
+      int reader = -1, writer = -1;
+      for (const char* step = order; *step != '\0'; ++step) {
+        switch (*step) {
+          case 'R': reader = ::open(kScenario.c_str(), O_RDONLY | O_CLOEXEC); break;
+          case 'r': ::close(reader); reader = -1; break;
+          case 'W': writer = ::open(kScenario.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC); break;
+          case 'w': ASSERT_EQ(::write(writer, text.data(), text.size()),
+                              static_cast<ssize_t>(text.size())); break;
+          case 'c': ::close(writer); break;
+          case 'm': ASSERT_EQ(std::rename(staged.c_str(), kScenario.c_str()), 0); break;
+          default: break;
+        }
+      }
+      const std::string expected = valid ? "tr" + std::to_string(version) : "<unusable>";
+      EXPECT_EQ(waitForServed(expected), expected);
+      if (reader >= 0) ::close(reader);
+    }
+  }
+  replaceByRename(kScenario, scenarioSelecting(0));
 }
 
 }  // namespace

@@ -1,7 +1,8 @@
-// The client socket and the exchange against a scripted peer: what is taken
-// as an answer, what is ignored, and how a daemon that is away or stuck
-// ends an exchange.
-#include "ptp_management/uds_client.h"
+// The shared client socket and its exchanges against scripted peers: what
+// is taken as an answer, what is ignored, how a daemon that is away or stuck
+// ends an exchange, and exchanges with several daemons at once on the one
+// socket.
+#include "ptp_management/shared_uds_client.h"
 
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -11,6 +12,7 @@
 
 #include <cerrno>
 #include <future>
+#include <map>
 #include <optional>
 #include <string>
 #include <vector>
@@ -41,26 +43,40 @@ PendingGet get(ManagementId id, uint8_t transportSpecific = 0) {
   return pending;
 }
 
+// One exchange of `gets` with the socket at `server`, as the live service runs it.
+ExchangeOutcome exchangeWith(SharedUdsClient& client, const std::string& server,
+                             std::vector<PendingGet>& gets, Until until,
+                             std::chrono::milliseconds timeout = kWait) {
+  SharedUdsClient::Exchange exchange(client, server, gets);
+  ExchangeOutcome outcome;
+  outcome.failure = exchange.send();
+  if (outcome.failure.call != nullptr) return outcome;
+  return exchange.collect(until, Clock::now() + timeout);
+}
+
 struct Scene {
   answers_test::ScratchDir dir;
   DatagramPeer daemon{dir.file("daemon.sock")};
   SystemFailure failure;
-  std::unique_ptr<UdsClient> client = UdsClient::open(dir.str(), &failure);
+  SharedUdsClient client{dir.str()};
+  const bool opened = client.open(&failure);
 
   // Runs the exchange on another thread while the test plays the daemon.
   std::future<ExchangeOutcome> start(std::vector<PendingGet>& gets, Until until,
-                                     std::chrono::milliseconds timeout = kWait) {
-    return std::async(std::launch::async, [this, &gets, until, timeout] {
-      return exchange(*client, daemon.path(), gets, until, Clock::now() + timeout);
+                                     std::chrono::milliseconds timeout = kWait,
+                                     DatagramPeer* peer = nullptr) {
+    const std::string server = (peer != nullptr ? peer : &daemon)->path();
+    return std::async(std::launch::async, [this, &gets, until, timeout, server] {
+      return exchangeWith(client, server, gets, until, timeout);
     });
   }
   // The requests the client sent, decoded.
-  std::vector<std::pair<Answer, Bytes>> requests(size_t count) {
+  std::vector<std::pair<Answer, Bytes>> requests(size_t count, DatagramPeer* peer = nullptr) {
     std::vector<std::pair<Answer, Bytes>> out;
     for (size_t i = 0; i < count; ++i) {
-      auto received = daemon.receive(kWait);
+      auto received = (peer != nullptr ? peer : &daemon)->receive(kWait);
       if (!received) break;
-      EXPECT_EQ(received->from, client->path());
+      EXPECT_EQ(received->from, client.path());
       out.emplace_back(Answer{}, received->bytes);
       EXPECT_EQ(decodeAnswer(out.back().second.data(), out.back().second.size(),
                              &out.back().first),
@@ -72,7 +88,7 @@ struct Scene {
 
 TEST(UdsClient, AnswersAreMatchedByTheirRequestAndStraysIgnored) {
   Scene scene;
-  ASSERT_NE(scene.client, nullptr) << scene.failure.call << ": " << scene.failure.error;
+  ASSERT_TRUE(scene.opened) << scene.failure.call << ": " << scene.failure.error;
   std::vector<PendingGet> gets{get(ManagementId::kDefaultDataSet),
                                get(ManagementId::kPortDataSet)};
   auto outcome = scene.start(gets, Until::kEveryAnswer);
@@ -96,14 +112,14 @@ TEST(UdsClient, AnswersAreMatchedByTheirRequestAndStraysIgnored) {
       managementAnswer(first, quillon::test_support::defaultDataSet(1), 0, 0x2001),
       requests[0].second,  // its own GET echoed back is no RESPONSE
   };
-  for (const Bytes& stray : strays) scene.daemon.sendTo(scene.client->path(), stray);
+  for (const Bytes& stray : strays) scene.daemon.sendTo(scene.client.path(), stray);
   // The right answer from another socket is not the daemon's.
   DatagramPeer impostor(scene.dir.file("impostor.sock"));
-  impostor.sendTo(scene.client->path(),
+  impostor.sendTo(scene.client.path(),
                   managementAnswer(first, quillon::test_support::defaultDataSet(1)));
   // Answers in reverse order still find their requests.
-  scene.daemon.sendTo(scene.client->path(), errorStatusAnswer(second, 0x0004));
-  scene.daemon.sendTo(scene.client->path(),
+  scene.daemon.sendTo(scene.client.path(), errorStatusAnswer(second, 0x0004));
+  scene.daemon.sendTo(scene.client.path(),
                       managementAnswer(first, quillon::test_support::defaultDataSet(2)));
 
   const ExchangeOutcome result = outcome.get();
@@ -128,9 +144,9 @@ TEST(UdsClient, BrokenAnswersEndAsMalformedAndSilenceAsTimeOut) {
   // Cut after its sequence id: it is known whose answer failed.
   Bytes cut = managementAnswer(requests[0].first, quillon::test_support::defaultDataSet(1));
   cut.resize(40);
-  scene.daemon.sendTo(scene.client->path(), cut);
+  scene.daemon.sendTo(scene.client.path(), cut);
   // Too short to tell whose it is.
-  scene.daemon.sendTo(scene.client->path(), Bytes(10, 0x0D));
+  scene.daemon.sendTo(scene.client.path(), Bytes(10, 0x0D));
   const ExchangeOutcome result = outcome.get();
   EXPECT_TRUE(result.timedOut);
   EXPECT_EQ(result.unmatchedMalformed, DecodeError::kShorterThanHeader);
@@ -152,8 +168,7 @@ TEST(UdsClient, DaemonsAwayOrNotReadingFailTheSendAtOnce) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
-    const ExchangeOutcome result =
-        exchange(*scene.client, c.server, one, Until::kEveryAnswer, Clock::now() + kWait);
+    const ExchangeOutcome result = exchangeWith(scene.client, c.server, one, Until::kEveryAnswer);
     ASSERT_NE(result.failure.call, nullptr);
     EXPECT_STREQ(result.failure.call, "sendto");
     EXPECT_EQ(result.failure.error, c.error);
@@ -161,9 +176,48 @@ TEST(UdsClient, DaemonsAwayOrNotReadingFailTheSendAtOnce) {
   // A daemon that stopped reading fills its queue; the client never blocks.
   std::vector<PendingGet> many(64, get(ManagementId::kDefaultDataSet));
   const ExchangeOutcome full =
-      exchange(*scene.client, scene.daemon.path(), many, Until::kEveryAnswer, Clock::now() + kWait);
+      exchangeWith(scene.client, scene.daemon.path(), many, Until::kEveryAnswer);
   EXPECT_STREQ(full.failure.call, "sendto");
   EXPECT_EQ(full.failure.error, EAGAIN);
+}
+
+// Two daemons, and two exchanges with one of them, in flight at once: each
+// answer reaches the exchange that asked, by sender and sequence id.
+TEST(UdsClient, ConcurrentExchangesShareTheSocket) {
+  Scene scene;
+  DatagramPeer other(scene.dir.file("other.sock"));
+  std::vector<PendingGet> first{get(ManagementId::kDefaultDataSet)};
+  std::vector<PendingGet> second{get(ManagementId::kDefaultDataSet)};
+  std::vector<PendingGet> third{get(ManagementId::kDefaultDataSet)};
+  auto one = scene.start(first, Until::kEveryAnswer);
+  auto two = scene.start(second, Until::kEveryAnswer);
+  auto three = scene.start(third, Until::kEveryAnswer, kWait, &other);
+  auto toDaemon = scene.requests(2);
+  auto toOther = scene.requests(1, &other);
+  ASSERT_EQ(toDaemon.size(), 2u);
+  ASSERT_EQ(toOther.size(), 1u);
+  // Answered with the number of ports telling who answered what, in reverse.
+  other.sendTo(scene.client.path(),
+               managementAnswer(toOther[0].first, quillon::test_support::defaultDataSet(3)));
+  for (int i = 1; i >= 0; --i) {
+    scene.daemon.sendTo(scene.client.path(),
+                        managementAnswer(toDaemon[i].first,
+                                         quillon::test_support::defaultDataSet(10 + i)));
+  }
+  std::map<uint16_t, uint16_t> portsBySequence{{toDaemon[0].first.sequenceId, 10},
+                                               {toDaemon[1].first.sequenceId, 11}};
+  EXPECT_FALSE(one.get().timedOut);
+  EXPECT_FALSE(two.get().timedOut);
+  EXPECT_FALSE(three.get().timedOut);
+  const auto ports = [](const std::vector<PendingGet>& gets) {
+    DefaultDataSet defaults;
+    return gets[0].answered && decodeDataSet(gets[0].answer, &defaults) == DecodeError::kNone
+               ? defaults.numberPorts
+               : 0;
+  };
+  EXPECT_EQ(ports(first), portsBySequence[first[0].request.sequenceId]);
+  EXPECT_EQ(ports(second), portsBySequence[second[0].request.sequenceId]);
+  EXPECT_EQ(ports(third), 3);
 }
 
 TEST(UdsClient, PathsAreTheClientsOwnAndNeverLeftBehind) {

@@ -5,6 +5,7 @@
 #include <sys/un.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstring>
 #include <stdexcept>
 
@@ -217,9 +218,30 @@ void FakeDaemon::resetCounts() {
   counts_.clear();
 }
 
+void FakeDaemon::setDelay(std::chrono::milliseconds delay) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  delay_ = delay;
+}
+
 void FakeDaemon::run() {
+  using std::chrono::steady_clock;
+  struct Due {
+    steady_clock::time_point at;
+    std::string to;
+    Bytes bytes;
+  };
+  std::deque<Due> due;  // in the order they fall due: the delay changes seldom
   while (!stop_) {
-    const auto received = peer_.receive(std::chrono::milliseconds(20));
+    while (!due.empty() && due.front().at <= steady_clock::now()) {
+      peer_.sendTo(due.front().to, due.front().bytes);
+      due.pop_front();
+    }
+    auto wait = std::chrono::milliseconds(20);
+    if (!due.empty()) {
+      wait = std::min(wait, std::chrono::ceil<std::chrono::milliseconds>(due.front().at -
+                                                                          steady_clock::now()));
+    }
+    const auto received = peer_.receive(std::max(wait, std::chrono::milliseconds(0)));
     if (!received) continue;
     ptpmgmt::Answer request;
     if (ptpmgmt::decodeAnswer(received->bytes.data(), received->bytes.size(), &request) !=
@@ -227,12 +249,14 @@ void FakeDaemon::run() {
       continue;
     }
     std::vector<Bytes> replies;
+    steady_clock::time_point at;
     {
       std::lock_guard<std::mutex> lock(mutex_);
       ++counts_[request.managementId];
       replies = script_(request);
+      at = steady_clock::now() + delay_;
     }
-    for (const Bytes& reply : replies) peer_.sendTo(received->from, reply);
+    for (Bytes& reply : replies) due.push_back({at, received->from, std::move(reply)});
   }
 }
 

@@ -10,6 +10,7 @@
 #include <atomic>
 #include <chrono>
 #include <cstdint>
+#include <deque>
 #include <functional>
 #include <map>
 #include <mutex>
@@ -76,6 +77,9 @@ class FakeDaemon {
 
   const std::string& path() const { return peer_.path(); }
   void setScript(Script script);
+  // Answers leave this long after their request came in (others are taken
+  // in meanwhile), as from a daemon behind a slow link.
+  void setDelay(std::chrono::milliseconds delay);
   // Requests received for management id `id`, and in all.
   int requests(ptpmgmt::ManagementId id) const;
   int requests() const;
@@ -88,6 +92,7 @@ class FakeDaemon {
   mutable std::mutex mutex_;
   Script script_;                     // guarded by mutex_
   std::map<uint16_t, int> counts_;    // guarded by mutex_
+  std::chrono::milliseconds delay_{0};  // guarded by mutex_
   std::atomic<bool> stop_{false};
   std::thread thread_;
 };

@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <system_error>
 #include <vector>
 
 namespace kopdmlive {
@@ -112,46 +113,82 @@ bool anyAnswered(const std::vector<PendingGet>& gets) {
 }  // namespace
 
 DaemonLink::DaemonLink(TrConfig tr, std::chrono::milliseconds timeout,
-                       std::chrono::milliseconds maxAge, std::string clientDirectory)
+                       std::chrono::milliseconds maxAge,
+                       std::shared_ptr<ptpmgmt::SharedUdsClient> client)
     : tr_(std::move(tr)),
       timeout_(timeout),
       maxAge_(maxAge),
-      clientDirectory_(std::move(clientDirectory)),
+      client_(std::move(client)),
       self_(clientIdentity()) {}
 
-std::shared_ptr<const DaemonState> DaemonLink::load() const {
-  std::lock_guard<std::mutex> lock(stateMutex_);
-  return state_;
+// No call runs any more; the refresher still needs mutex_ for its last step.
+DaemonLink::~DaemonLink() {
+  if (refresher_.joinable()) refresher_.join();
 }
 
-void DaemonLink::store(std::shared_ptr<const DaemonState> state) {
-  std::lock_guard<std::mutex> lock(stateMutex_);
-  state_ = std::move(state);
-}
-
+// Counted from the answers' arrival, not from the request: a daemon slower
+// than the age would otherwise be asked again by the very next call, and a
+// burst would cost an exchange per call instead of one.
 bool DaemonLink::fresh(const DaemonState& state, Clock::time_point now) const {
-  return state.reusable && now - state.takenAt < maxAge_;
+  return state.reusable && now - state.answeredAt < maxAge_;
 }
 
 std::shared_ptr<const DaemonState> DaemonLink::state() {
-  std::shared_ptr<const DaemonState> seen = load();
+  std::unique_lock<std::mutex> lock(mutex_);
   const Clock::time_point now = Clock::now();
-  if (seen && fresh(*seen, now)) return seen;
-  std::unique_lock<std::mutex> exchange(exchangeMutex_, std::try_to_lock);
-  if (!exchange.owns_lock()) {
-    // Another thread is asking the daemon right now.
-    if (seen && now - seen->takenAt < kServeLimit) return seen;
-    exchange.lock();
-    std::shared_ptr<const DaemonState> answered = load();
-    // What the other thread learnt, rather than a second wait.
-    if (answered != seen) return answered;
-  } else if (std::shared_ptr<const DaemonState> latest = load();
-             latest != seen && latest && fresh(*latest, Clock::now())) {
-    return latest;
+  if (state_ && fresh(*state_, now)) return state_;
+  const bool recent = state_ && now - state_->takenAt < kServeLimit;
+  if (asking_) {
+    if (recent) return state_;
+    // What that exchange learns, rather than a second one.
+    const uint64_t seen = exchanges_;
+    answered_.wait(lock, [&] { return exchanges_ != seen; });
+    return state_;
   }
-  std::shared_ptr<const DaemonState> asked = ask();
-  store(asked);
+  asking_ = true;
+  // A daemon that could not be reached is asked again by this very call:
+  // its answer (or its absence) comes at once.
+  if (recent && state_->reusable && refreshInBackground()) return state_;
+  lock.unlock();
+  std::shared_ptr<const DaemonState> asked;
+  try {
+    asked = ask();
+  } catch (...) {
+    // Out of memory: the waiters must not wait for an exchange that ended.
+    lock.lock();
+    finish(nullptr);
+    throw;
+  }
+  lock.lock();
+  finish(asked);
   return asked;
+}
+
+bool DaemonLink::refreshInBackground() {
+  // The previous refresher cleared asking_ as its last step under the lock.
+  if (refresher_.joinable()) refresher_.join();
+  try {
+    refresher_ = std::thread([this] {
+      std::shared_ptr<const DaemonState> asked;
+      try {
+        asked = ask();
+      } catch (...) {
+        // Out of memory: the previous answers stay, until they are too old.
+      }
+      std::lock_guard<std::mutex> lock(mutex_);
+      finish(std::move(asked));
+    });
+  } catch (const std::system_error&) {
+    return false;
+  }
+  return true;
+}
+
+void DaemonLink::finish(std::shared_ptr<const DaemonState> asked) {
+  if (asked) state_ = std::move(asked);
+  asking_ = false;
+  ++exchanges_;
+  answered_.notify_all();
 }
 
 PendingGet DaemonLink::pendingGet(ManagementId id, uint8_t transportSpecific) const {
@@ -169,59 +206,100 @@ std::shared_ptr<const DaemonState> DaemonLink::ask() {
   auto state = std::make_shared<DaemonState>();
   state->takenAt = Clock::now();
   const Clock::time_point deadline = state->takenAt + timeout_;
-  if (!ensureClient(*state)) return state;
-  const bool probe = transportSpecific_ < 0;
-  if (probe && !probeTransport(*state, deadline)) {
-    state->takenAt = Clock::now();
-    return state;
+  if (ensureClient(*state)) {
+    const Probe probe =
+        transportSpecific_ < 0 ? probeTransport(*state, deadline) : Probe::kNotNeeded;
+    if (probe == Probe::kNotNeeded || probe == Probe::kDefaultsOnly) {
+      askRest(*state, deadline, probe == Probe::kDefaultsOnly);
+    } else if (probe == Probe::kFailed) {
+      state->takenAt = Clock::now();
+    }
   }
-  askRest(*state, deadline, probe);
+  state->answeredAt = Clock::now();
   return state;
 }
 
 bool DaemonLink::ensureClient(DaemonState& state) {
-  if (client_) return true;
   ptpmgmt::SystemFailure failure;
-  client_ = ptpmgmt::UdsClient::open(clientDirectory_, &failure);
-  if (client_) return true;
+  if (client_->open(&failure)) return true;
   failAll(state, FailureKind::kUnreachable, failure, DecodeError::kNone, false);
   state.reusable = false;
   return false;
 }
 
+std::vector<PendingGet> DaemonLink::requests(uint8_t transportSpecific, bool haveDefaults) const {
+  std::vector<PendingGet> gets;
+  DaemonState shape;
+  forEachDataSet(shape, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
+    gets.push_back(pendingGet(DataSet::kId, transportSpecific));
+  });
+  return gets;
+}
+
+// `gets` as `requests` made them.
+void DaemonLink::fill(DaemonState& state, const std::vector<PendingGet>& gets,
+                      const ExchangeOutcome& outcome, bool haveDefaults) const {
+  size_t next = 0;
+  forEachDataSet(state, [&](auto& fetched) {
+    using DataSet = decltype(fetched.value);
+    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
+    fillFromAnswer(fetched, gets[next++], outcome, false);
+  });
+}
+
 // A daemon configured for IEEE 802.1AS answers only requests that carry its
-// transportSpecific, so the first exchange asks both ways at once.
-bool DaemonLink::probeTransport(DaemonState& state, Clock::time_point deadline) {
-  std::vector<PendingGet> gets{pendingGet(ManagementId::kDefaultDataSet, 0),
-                               pendingGet(ManagementId::kDefaultDataSet, 1)};
-  const ExchangeOutcome outcome =
-      ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kAnyAnswer, deadline);
+// transportSpecific. The first exchange asks every data set with 0, the
+// usual value, and the default data set with 1 as well: one round trip shows
+// which kind the daemon is, and for the usual kind it is the only one. That
+// is eight datagrams, within the ten a daemon's socket queues.
+DaemonLink::Probe DaemonLink::probeTransport(DaemonState& state, Clock::time_point deadline) {
+  std::vector<PendingGet> gets = requests(0, false);
+  gets.push_back(pendingGet(ManagementId::kDefaultDataSet, 1));
+  ptpmgmt::SharedUdsClient::Exchange exchange(*client_, tr_.uds, gets);
+  if (const ptpmgmt::SystemFailure failure = exchange.send(); failure.call != nullptr) {
+    failSend(state, failure, true);
+    return Probe::kFailed;
+  }
+  const ExchangeOutcome outcome = exchange.collect(ptpmgmt::Until::kAnyAnswer, deadline);
   if (outcome.failure.call != nullptr) {
     failSend(state, outcome.failure, true);
-    return false;
+    return Probe::kFailed;
   }
-  const PendingGet& answered = gets[0].answered ? gets[0] : gets[1];
-  if (!answered.answered) {
+  if (!anyAnswered(gets)) {
     failSilent(state, outcome, true);
-    return false;
+    return Probe::kFailed;
   }
-  transportSpecific_ = answered.request.transportSpecific;
-  fillFromAnswer(state.defaults, answered, outcome, true);
-  return true;
+  if (gets.back().answered) {
+    transportSpecific_ = 1;
+    state.transportSpecific = 1;
+    fillFromAnswer(state.defaults, gets.back(), outcome, false);
+    return Probe::kDefaultsOnly;
+  }
+  transportSpecific_ = 0;
+  state.transportSpecific = 0;
+  gets.pop_back();
+  // The request with 1 stays unanswered: no longer waited for.
+  const ExchangeOutcome rest = exchange.collect(ptpmgmt::Until::kEveryAnswer, deadline);
+  if (rest.failure.call != nullptr) {
+    failSend(state, rest.failure, false);
+    return Probe::kFailed;
+  }
+  fill(state, gets, rest, false);
+  return Probe::kComplete;
 }
 
 void DaemonLink::askRest(DaemonState& state, Clock::time_point deadline, bool haveDefaults) {
   const uint8_t transportSpecific = static_cast<uint8_t>(transportSpecific_);
   state.transportSpecific = transportSpecific;
-  std::vector<PendingGet> gets;
-  forEachDataSet(state, [&](auto& fetched) {
-    using DataSet = decltype(fetched.value);
-    // The probe already brought the default data set.
-    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
-    gets.push_back(pendingGet(DataSet::kId, transportSpecific));
-  });
-  const ExchangeOutcome outcome =
-      ptpmgmt::exchange(*client_, tr_.uds, gets, ptpmgmt::Until::kEveryAnswer, deadline);
+  std::vector<PendingGet> gets = requests(transportSpecific, haveDefaults);
+  ptpmgmt::SharedUdsClient::Exchange exchange(*client_, tr_.uds, gets);
+  if (const ptpmgmt::SystemFailure failure = exchange.send(); failure.call != nullptr) {
+    failSend(state, failure, false);
+    return;
+  }
+  const ExchangeOutcome outcome = exchange.collect(ptpmgmt::Until::kEveryAnswer, deadline);
   if (outcome.failure.call != nullptr) {
     failSend(state, outcome.failure, false);
     return;
@@ -234,12 +312,7 @@ void DaemonLink::askRest(DaemonState& state, Clock::time_point deadline, bool ha
     state.takenAt = Clock::now();
     return;
   }
-  size_t next = 0;
-  forEachDataSet(state, [&](auto& fetched) {
-    using DataSet = decltype(fetched.value);
-    if (DataSet::kId == ManagementId::kDefaultDataSet && haveDefaults) return;
-    fillFromAnswer(fetched, gets[next++], outcome, false);
-  });
+  fill(state, gets, outcome, haveDefaults);
 }
 
 }  // namespace kopdmlive

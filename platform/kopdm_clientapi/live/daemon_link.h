@@ -2,24 +2,31 @@
 // data sets it last answered, asked again over its management socket when
 // they are older than the configured age.
 //
-// One exchange asks for every data set at once, so a burst of calls costs at
-// most one management round trip per data set. While one thread asks, the
-// others are served the previous answers when those are younger than
-// kServeLimit, or wait for the exchange, which ends within the timeout.
+// One exchange asks for every data set at once, and answers are reused for
+// the configured age counted from their arrival, so a burst of calls costs at
+// most one exchange per age period however slow the daemon is. At most one
+// exchange is in flight. When the answers are due again but younger than
+// kServeLimit, the call that notices starts the exchange on a thread of its
+// own and, like every call until it ends, is served the previous answers;
+// only calls with nothing that recent wait, for that one exchange, which ends
+// within the timeout.
 //
 // Thread-safety: every operation may run on several threads at once.
 #ifndef KOPDM_CLIENTAPI_LIVE_DAEMON_LINK_H_
 #define KOPDM_CLIENTAPI_LIVE_DAEMON_LINK_H_
 
 #include <chrono>
+#include <condition_variable>
 #include <cstdint>
 #include <memory>
 #include <mutex>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include "live/live_config.h"
 #include "ptp_management/codec.h"
-#include "ptp_management/uds_client.h"
+#include "ptp_management/shared_uds_client.h"
 
 namespace kopdmlive {
 
@@ -53,7 +60,8 @@ struct Fetched {
 };
 
 struct DaemonState {
-  Clock::time_point takenAt;  // when it was asked for (failures: when they were known)
+  Clock::time_point takenAt;     // when it was asked for (failures: when they were known)
+  Clock::time_point answeredAt;  // when the exchange ended
   bool reusable = true;       // false: the next call asks again at once
   uint8_t transportSpecific = 0;
   Fetched<ptpmgmt::DefaultDataSet> defaults;
@@ -67,8 +75,11 @@ struct DaemonState {
 
 class DaemonLink {
  public:
+  // Exchanges go through `client`, the process's one client socket.
   DaemonLink(TrConfig tr, std::chrono::milliseconds timeout, std::chrono::milliseconds maxAge,
-             std::string clientDirectory);
+             std::shared_ptr<ptpmgmt::SharedUdsClient> client);
+  // Waits for an exchange in flight (at most the timeout).
+  ~DaemonLink();
   DaemonLink(const DaemonLink&) = delete;
   DaemonLink& operator=(const DaemonLink&) = delete;
 
@@ -76,32 +87,50 @@ class DaemonLink {
   std::chrono::milliseconds timeout() const { return timeout_; }
 
   // The daemon's data sets, none older than kServeLimit; blocks at most the
-  // timeout. Never null: failures are inside.
+  // timeout, and only when nothing that recent is known. Never null:
+  // failures are inside.
   std::shared_ptr<const DaemonState> state();
 
  private:
-  std::shared_ptr<const DaemonState> load() const;
-  void store(std::shared_ptr<const DaemonState> state);
   bool fresh(const DaemonState& state, Clock::time_point now) const;
-  // Asks the daemon; exchangeMutex_ held.
+  // Starts an exchange on a thread of its own; false when no thread could
+  // be made. mutex_ held, asking_ set.
+  bool refreshInBackground();
+  // Ends the exchange in flight with what it learnt (null: nothing, the
+  // previous state stays); mutex_ held.
+  void finish(std::shared_ptr<const DaemonState> asked);
+  // Asks the daemon; only while asking_ is set by this thread's caller.
   std::shared_ptr<const DaemonState> ask();
   bool ensureClient(DaemonState& state);
-  bool probeTransport(DaemonState& state, Clock::time_point deadline);
+  enum class Probe {
+    kNotNeeded,     // the transportSpecific is known
+    kFailed,        // every data set failed
+    kDefaultsOnly,  // an IEEE 802.1AS daemon: the other data sets are still to ask
+    kComplete,      // every data set answered or failed
+  };
+  Probe probeTransport(DaemonState& state, Clock::time_point deadline);
+  // The GETs of every data set, the default one aside when `haveDefaults`.
+  std::vector<ptpmgmt::PendingGet> requests(uint8_t transportSpecific, bool haveDefaults) const;
+  void fill(DaemonState& state, const std::vector<ptpmgmt::PendingGet>& gets,
+            const ptpmgmt::ExchangeOutcome& outcome, bool haveDefaults) const;
   void askRest(DaemonState& state, Clock::time_point deadline, bool haveDefaults);
   ptpmgmt::PendingGet pendingGet(ptpmgmt::ManagementId id, uint8_t transportSpecific) const;
 
   const TrConfig tr_;
   const std::chrono::milliseconds timeout_;
   const std::chrono::milliseconds maxAge_;
-  const std::string clientDirectory_;
+  const std::shared_ptr<ptpmgmt::SharedUdsClient> client_;
   const ptpmgmt::PortIdentity self_;
 
-  std::mutex exchangeMutex_;                   // held for one exchange
-  std::unique_ptr<ptpmgmt::UdsClient> client_;  // guarded by exchangeMutex_
-  int transportSpecific_ = -1;                 // guarded by exchangeMutex_; -1: unknown
+  // Used only by the one thread that asks (asking_ hands it over).
+  int transportSpecific_ = -1;  // -1: unknown
 
-  mutable std::mutex stateMutex_;
-  std::shared_ptr<const DaemonState> state_;  // guarded by stateMutex_
+  std::mutex mutex_;
+  std::condition_variable answered_;          // an exchange ended
+  std::shared_ptr<const DaemonState> state_;  // guarded by mutex_
+  bool asking_ = false;                       // guarded by mutex_
+  uint64_t exchanges_ = 0;                    // ended so far; guarded by mutex_
+  std::thread refresher_;                     // guarded by mutex_
 };
 
 }  // namespace kopdmlive

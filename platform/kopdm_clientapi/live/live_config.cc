@@ -4,17 +4,27 @@
 #include <sys/un.h>
 
 #include <cmath>
+#include <cstdio>
 #include <memory>
 #include <set>
 #include <string_view>
 
 #include "answer_text.h"
+#include "live/attributes.h"
 
 namespace kopdmlive {
 namespace {
 
 // Reported in the selected-TR buffer of 256 bytes, with its terminator.
 constexpr size_t kMaxIdBytes = 255;
+// The plug-in reads the manager's answers into 1024-byte buffers, with
+// their terminator; a longer "timeReferences" answer would reach it cut.
+constexpr size_t kMaxAnswerBytes = 1023;
+// What a "\u0000" escape is read as: cJSON would end the string there, and
+// an id or path cut short would be served as if it were the whole. U+10FFFF
+// is a noncharacter, which no configuration has a use for.
+constexpr const char* kNulEscape = "\\uDBFF\\uDFFF";
+constexpr std::string_view kNulMarker = "\xF4\x8F\xBF\xBF";
 constexpr uint32_t kMaxTimeoutMillis = 10000;
 // Older state is never served, so the refresh age stays well below.
 constexpr uint32_t kMaxAgeLimitMillis = 900;
@@ -67,6 +77,28 @@ std::string readString(const cJSON* object, const char* name, const std::string&
   return member->valuestring;
 }
 
+// Identifiers become a segment of the plug-in's URIs and a string of its
+// JSON, which it writes without escaping: only RFC 3986's unreserved
+// characters (section 2.3) need no escape in either.
+bool isSafeIdCharacter(char c) {
+  return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '-' ||
+         c == '.' || c == '_' || c == '~';
+}
+
+void checkId(const std::string& id, const std::string& prefix) {
+  for (size_t i = 0; i < id.size(); ++i) {
+    if (isSafeIdCharacter(id[i])) continue;
+    char hex[8];
+    std::snprintf(hex, sizeof hex, "0x%02X", static_cast<unsigned char>(id[i]));
+    invalid(prefix + "\"id\" holds the byte " + hex + " at offset " + std::to_string(i) +
+            ": only letters A-Z and a-z, digits and \"-._~\" may be used");
+  }
+  // "." and ".." are path steps, which clients resolve away.
+  if (id == "." || id == ".." || id.size() > kMaxIdBytes) {
+    invalid(prefix + "\"id\" must not be \".\" or \"..\" nor be longer than 255 bytes");
+  }
+}
+
 bool isKnownType(const std::string& type) {
   for (const char* known : kKnownTypes) {
     if (type == known) return true;
@@ -81,10 +113,7 @@ TrConfig readTimeReference(const cJSON* entry, size_t index) {
   const std::string prefix = where + ".";
   TrConfig tr;
   tr.id = readString(entry, "id", prefix);
-  // The identifier becomes one segment of a timescale URI.
-  if (tr.id.find('/') != std::string::npos || tr.id.size() > kMaxIdBytes) {
-    invalid(prefix + "\"id\" must not contain \"/\" nor be longer than 255 bytes");
-  }
+  checkId(tr.id, prefix);
   tr.uds = readString(entry, "uds", prefix);
   if (tr.uds.size() >= sizeof(sockaddr_un::sun_path)) {
     invalid(prefix + "\"uds\" is longer than a socket path may be (107 bytes)");
@@ -115,6 +144,11 @@ void readTimeReferences(const cJSON* root, LiveConfig& config) {
     }
     config.trs.push_back(std::move(tr));
   }
+  const size_t answerBytes = timeReferencesAnswer(config).size();
+  if (answerBytes > kMaxAnswerBytes) {
+    invalid("\"timeReferences\" lists more than the plug-in can read: the answer naming them "
+            "would be " + std::to_string(answerBytes) + " bytes, more than 1023");
+  }
 }
 
 void readSelection(const cJSON* root, LiveConfig& config) {
@@ -132,8 +166,30 @@ void readSelection(const cJSON* root, LiveConfig& config) {
           ", which is not in \"timeReferences\"");
 }
 
+bool holdsNul(const char* text) {
+  return text != nullptr && std::string_view(text).find(kNulMarker) != std::string_view::npos;
+}
+
+// Where the first text in the tree that holds a NUL is, in the form the
+// other problems name members; empty when none does.
+std::string findNul(const cJSON* node, const std::string& where) {
+  size_t index = 0;
+  for (const cJSON* child = node->child; child != nullptr; child = child->next, ++index) {
+    if (holdsNul(child->string)) return where + (where.empty() ? "" : ": ") + "a member name";
+    const std::string path =
+        child->string != nullptr ? where + (where.empty() ? "" : ".") + quoted(child->string)
+                                 : where + "[" + std::to_string(index) + "]";
+    if (cJSON_IsString(child) && holdsNul(child->valuestring)) return path;
+    std::string found = findNul(child, path);
+    if (!found.empty()) return found;
+  }
+  return "";
+}
+
 void readConfig(const cJSON* root, LiveConfig& config) {
   if (!cJSON_IsObject(root)) invalid("the configuration must be an object");
+  const std::string withNul = findNul(root, "");
+  if (!withNul.empty()) invalid(withNul + " must not contain NUL (\\u0000)");
   refuseUnknownMembers(root, {"timeReferences", "selectedTr", "timeoutMillis", "maxAgeMillis"},
                        "");
   readTimeReferences(root, config);
@@ -144,13 +200,51 @@ void readConfig(const cJSON* root, LiveConfig& config) {
       readInteger(root, "maxAgeMillis", "", 0, kMaxAgeLimitMillis, config.maxAgeMillis);
 }
 
+// `text` with every "\u0000" escape in a string replaced by kNulEscape.
+std::string markNulEscapes(const std::string& text) {
+  std::string marked;
+  marked.reserve(text.size());
+  bool inString = false;
+  for (size_t i = 0; i < text.size(); ++i) {
+    const char c = text[i];
+    if (inString && c == '\\' && i + 1 < text.size()) {
+      if (text.compare(i, 6, "\\u0000") == 0) {
+        marked += kNulEscape;
+        i += 5;
+      } else {
+        marked.append(text, i, 2);
+        ++i;
+      }
+      continue;
+    }
+    if (c == '"') inString = !inString;
+    marked += c;
+  }
+  return marked;
+}
+
 }  // namespace
 
+std::string timeReferencesAnswer(const LiveConfig& config) {
+  std::string answer = "{\"timeReferences\":[";
+  for (size_t i = 0; i < config.trs.size(); ++i) {
+    if (i > 0) answer += ',';
+    answer += jsonString(config.trs[i].id);
+  }
+  return answer + "]}";
+}
+
 bool parseLiveConfig(const std::string& text, LiveConfig* out, std::string* problem) {
+  // A NUL byte would end the text for the parser, unseen.
+  if (const size_t nul = text.find('\0'); nul != std::string::npos) {
+    *problem = "the text holds a NUL byte at offset " + std::to_string(nul);
+    return false;
+  }
+  const std::string marked = markNulEscapes(text);
   const char* end = nullptr;
-  std::unique_ptr<cJSON, JsonDeleter> root(cJSON_ParseWithOpts(text.c_str(), &end, 1));
+  std::unique_ptr<cJSON, JsonDeleter> root(cJSON_ParseWithOpts(marked.c_str(), &end, 1));
   if (!root) {
-    *problem = kopdmsim::syntaxProblem(text, end);
+    *problem = kopdmsim::syntaxProblem(marked, end);
     return false;
   }
   try {

@@ -33,6 +33,9 @@ struct LiveConfig {
   uint32_t maxAgeMillis = 100;      // a daemon's state is asked again when older
 };
 
+// The manager's answer for "timeReferences": the ids, in file order.
+std::string timeReferencesAnswer(const LiveConfig& config);
+
 // Reads a configuration text. False, with a sentence saying what is wrong,
 // when it is not a usable configuration.
 [[nodiscard]] bool parseLiveConfig(const std::string& text, LiveConfig* out, std::string* problem);

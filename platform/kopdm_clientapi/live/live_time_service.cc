@@ -88,7 +88,8 @@ const char* nameOr(const char* name, const char* fallback) {
 }  // namespace
 
 LiveTimeService::LiveTimeService(std::string configPath, std::string clientDirectory)
-    : path_(std::move(configPath)), clientDirectory_(std::move(clientDirectory)) {
+    : path_(std::move(configPath)),
+      client_(std::make_shared<ptpmgmt::SharedUdsClient>(std::move(clientDirectory))) {
   watch_ = std::make_unique<kopdmsim::ScenarioWatch>(
       path_, [this](const kopdmsim::ScenarioWatch::Settling& settling) { reload(&settling); });
   // Loaded after the watch exists, so an edit in between is not missed.
@@ -106,7 +107,7 @@ std::shared_ptr<const LiveTimeService::State> LiveTimeService::loadState() const
   const auto timeout = std::chrono::milliseconds(state->config.timeoutMillis);
   const auto maxAge = std::chrono::milliseconds(state->config.maxAgeMillis);
   for (const TrConfig& tr : state->config.trs) {
-    state->links.push_back(std::make_unique<DaemonLink>(tr, timeout, maxAge, clientDirectory_));
+    state->links.push_back(std::make_unique<DaemonLink>(tr, timeout, maxAge, client_));
   }
   return state;
 }

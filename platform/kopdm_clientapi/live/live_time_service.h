@@ -87,7 +87,8 @@ class LiveTimeService : public kopdmsim::Backend {
   int32_t reportNoSelectedTr(koerr::Status& status, Call call) const;
 
   const std::string path_;
-  const std::string clientDirectory_;
+  // One client socket for every daemon, kept across reloads.
+  const std::shared_ptr<ptpmgmt::SharedUdsClient> client_;
   mutable std::mutex mutex_;
   std::shared_ptr<const State> state_;  // guarded by mutex_
   std::unique_ptr<kopdmsim::ScenarioWatch> watch_;

@@ -2,6 +2,7 @@
 
 #include <arpa/inet.h>
 
+#include <algorithm>
 #include <charconv>
 #include <filesystem>
 #include <thread>
@@ -15,6 +16,10 @@ namespace ws::host {
 namespace {
 
 constexpr unsigned kMaxThreads = 256;
+// Threads beyond one per processor: a plug-in's call may wait on an outside
+// service (a time-sync daemon that answers late), and a waiting call holds
+// its thread and every connection that thread serves.
+constexpr unsigned kWaitingThreads = 4;
 constexpr uint64_t kMinConnections = 16;
 constexpr uint64_t kMaxConnections = 1000000;
 
@@ -61,7 +66,8 @@ std::string usage() {
          "  --plugin    the plug-in library (default " + defaultPluginPath() + ")\n"
          "  --service   the entry-point prefix and mount point /NAME (default quillon)\n"
          "  --threads   request threads, 1.." + std::to_string(kMaxThreads) +
-         " (default: one per processor)\n"
+         " (default: one per processor, plus " +
+         std::to_string(kWaitingThreads) + ")\n"
          "  --max-body  largest request body accepted, in bytes (default 1048576)\n"
          "  --max-connections  open connections at most (default 10000)\n"
          "  --access-log  append the access log to PATH, reopened on SIGHUP (default stderr)\n"
@@ -158,7 +164,7 @@ std::optional<Options> parseOptions(const std::vector<std::string>& args, std::s
   }
   if (options.threads == 0) {
     const unsigned cores = std::thread::hardware_concurrency();
-    options.threads = cores == 0 ? 1 : (cores > kMaxThreads ? kMaxThreads : cores);
+    options.threads = std::min((cores == 0 ? 1 : cores) + kWaitingThreads, kMaxThreads);
   }
   return options;
 }

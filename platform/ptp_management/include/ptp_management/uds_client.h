@@ -1,7 +1,7 @@
 // The client end of a ptp4l management socket: a UNIX-domain datagram socket
 // bound to a path of its own (the daemon answers to the address it received
-// from, so an unbound client would hear nothing), and the exchange of GET
-// requests for answers matched by sequence id.
+// from, so an unbound client would hear nothing), and what an exchange of
+// GET requests and their answers is made of (shared_uds_client.h runs them).
 //
 // Client paths are "<directory>/kopdm.<pid>.<n>", unique in the process and
 // removed when the client is destroyed; paths left by processes that no
@@ -53,16 +53,14 @@ class UdsClient {
   // full.
   [[nodiscard]] SystemFailure send(const std::string& serverPath, const uint8_t* bytes,
                                    size_t size);
-  // Waits until `deadline` for one datagram from `serverPath` and copies up
-  // to `capacity` bytes of it. Returns its whole size (larger than
-  // `capacity` when it was cut), 0 when the deadline passed, -1 with
-  // `*failure` set when the system failed. Datagrams from other senders are
-  // dropped.
-  [[nodiscard]] ssize_t receive(const std::string& serverPath, uint8_t* buffer, size_t capacity,
-                                Clock::time_point deadline, SystemFailure* failure);
-  // Drops every datagram already queued: late answers to an exchange that
-  // timed out.
-  void drain();
+  // Takes one queued datagram without waiting, copying up to `capacity`
+  // bytes of it and its sender's path. Returns its whole size (larger than
+  // `capacity` when it was cut); -1 when none is queued (`failure->call`
+  // null) or when the system failed (`*failure` set).
+  [[nodiscard]] ssize_t receiveQueued(uint8_t* buffer, size_t capacity, std::string* from,
+                                      SystemFailure* failure);
+  // For waiting until a datagram is queued.
+  int fd() const { return fd_; }
 
  private:
   UdsClient(int fd, std::string path) : fd_(fd), path_(std::move(path)) {}
@@ -92,14 +90,6 @@ struct ExchangeOutcome {
   // did not decode far enough.
   DecodeError unmatchedMalformed = DecodeError::kNone;
 };
-
-// Sends every request to `serverPath`, then collects answers until `until`
-// is met or `deadline` passes. An answer belongs to a request when its
-// sequence id, transportSpecific and management id match, it is a RESPONSE
-// and it is addressed to the request's source; anything else is ignored.
-ExchangeOutcome exchange(UdsClient& client, const std::string& serverPath,
-                         std::vector<PendingGet>& gets, Until until,
-                         Clock::time_point deadline);
 
 }  // namespace ptpmgmt
 
