@@ -3,6 +3,7 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <string>
 #include <utility>
 #include <vector>
@@ -94,29 +95,32 @@ TEST(AccessLog, EscapesWhatCouldForgeALineOrDriveATerminal) {
   EXPECT_EQ(ws::host::escapeForLog("abcdef", 3), "abc");
 }
 
-TEST(ConnectionTable, EvictsTheLongestWaitingAndNeverABusyOne) {
+TEST(ConnectionTable, EvictsTheLongestWaitingSlowOnesAndNeverABusyOne) {
   constexpr int kCount = 6;
   int pairs[kCount][2];
   ws::host::ConnectionTable::Entry entries[kCount];
-  ws::host::ConnectionTable table(4, 2);
+  ws::host::ConnectionTable table(4, 2, ws::host::Pace{1024, 0});
+  std::atomic<uint64_t> received{0};
   for (int i = 0; i < kCount; ++i) ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pairs[i]), 0);
   const auto shut = [&](int i) {
     char byte;
     return recv(pairs[i][1], &byte, 1, MSG_DONTWAIT) == 0;
   };
   for (int i = 0; i < 4; ++i) {
-    EXPECT_EQ(table.add(entries[i], pairs[i][0]), 0u);
+    EXPECT_EQ(table.add(entries[i], pairs[i][0], i == 2 ? &received : nullptr), 0u);
     usleep(20000);  // distinct waiting times on the coarse clock
   }
   entries[0].busy();
   entries[3].busy();
-  // The fifth arrival finds 4 open: down to 2, taking the oldest waiting
-  // (1 and 2) and never the busy 0 and 3.
-  EXPECT_EQ(table.add(entries[4], pairs[4][0]), 2u);
+  entries[2].reading();
+  received += 1000000;  // a body arriving fast
+  // The fifth arrival finds 4 open: down to 2 if it can, taking the oldest
+  // slow one (1), never the fast 2 nor the busy 0 and 3.
+  EXPECT_EQ(table.add(entries[4], pairs[4][0]), 1u);
   EXPECT_EQ(std::vector<bool>({shut(0), shut(1), shut(2), shut(3), shut(4)}),
-            std::vector<bool>({false, true, true, false, false}));
+            std::vector<bool>({false, true, false, false, false}));
   table.remove(entries[1]);
-  table.remove(entries[2]);
+  table.remove(entries[3]);
   EXPECT_EQ(table.size(), 3u);
   // Below the mark nothing is evicted.
   EXPECT_EQ(table.add(entries[5], pairs[5][0]), 0u);

@@ -156,7 +156,7 @@ TEST(HostHardening, LogsControlAndInvalidBytesEscaped) {
   connection.receive(kAnswerMs);
   EXPECT_EQ(host.stop(), 0);
   const std::string log = host.log();
-  EXPECT_NE(log.find("127.0.0.1 GET /echo/e\\x1B[2J\\x0DX\\x08\\xFF\xc3\xa9\\x5C 400 54 "),
+  EXPECT_NE(log.find("127.0.0.1 GET /echo/e\\x1B[2J\\x0DX\\x08\\xFF\xc3\xa9\\x5C 400 36 "),
             std::string::npos)
       << log;
   EXPECT_EQ(log.find('\x1b'), std::string::npos);

@@ -266,14 +266,18 @@ bool StreamGuard::takeTrailerLine(char* data, size_t size, size_t& at, size_t& o
 }
 
 void StreamGuard::refuseHead(Refusal refusal, std::string_view head) {
-  const std::string_view line = head.substr(0, std::min(head.find('\n'), kMaxLoggedLine));
-  const size_t space = line.find(' ');
+  // The log shows what the line most likely meant: the method up to the
+  // first space, the target up to the version.
+  std::string_view line = head.substr(0, std::min(head.find('\n'), kMaxLoggedLine));
+  if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
+  const size_t space = std::min(line.find(' '), line.size());
   refusedMethod_.assign(line.substr(0, space));
-  refusedTarget_.clear();
-  if (space != std::string_view::npos) {
-    const std::string_view target = line.substr(space + 1);
-    refusedTarget_.assign(target.substr(0, target.find(' ')));
+  std::string_view target = line.substr(std::min(space + 1, line.size()));
+  const size_t last = target.rfind(' ');
+  if (last != std::string_view::npos && target.substr(last + 1, 5) == "HTTP/") {
+    target = target.substr(0, last);
   }
+  refusedTarget_.assign(target);
   ++heads_;
   refusedHead_ = heads_;
   refusal_ = refusal;
