@@ -264,4 +264,19 @@ TEST(HostHardening, SlowClientsHoldingManyConnectionsDoNotDenyService) {
   EXPECT_EQ(host.stop(), 0);
 }
 
+TEST(HostHardening, ConnectionsHeldByStalledBodiesAreEvicted) {
+  allowDescriptors(4096);
+  HostProcess host(echoArgs({"--quiet", "--max-connections", "64"}));
+  std::vector<std::unique_ptr<RawConnection>> stalled;
+  for (int i = 0; i < 200; ++i) {
+    stalled.push_back(std::make_unique<RawConnection>(host.port()));
+    stalled.back()->send("PUT /echo/echo HTTP/1.1\r\nHost: t\r\nContent-Length: 100000\r\n\r\nx");
+  }
+  RawConnection client(host.port());
+  client.send("GET /echo/echo HTTP/1.1\r\nHost: t\r\nConnection: close\r\n\r\n");
+  EXPECT_EQ(statusLine(client.receive(1000)), "HTTP/1.1 200 OK");
+  stalled.clear();
+  EXPECT_EQ(host.stop(), 0);
+}
+
 }  // namespace
