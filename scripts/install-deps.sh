@@ -7,7 +7,7 @@ packages=(
   cmake ninja-build g++ pkg-config make locales
   libgtest-dev libgmock-dev libbenchmark-dev
   libcjson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
-  linuxptp iproute2
+  linuxptp iproute2 nginx-light
   python3 python3-jsonschema python3-yaml
 )
 # Extra sets for the optional tools: 'fuzz', 'perf' and 'package' (see README).
