@@ -171,7 +171,8 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
   const std::string_view rest(data + at, size - at);
   const size_t end = findHeadEnd(rest, scanned_);
   if (end == 0) {
-    if (rest.size() > limits_.maxBytes) {
+    // Past the limit and the empty line that would end it.
+    if (rest.size() > limits_.maxBytes + 2) {
       refuseHead(Refusal::kHeadTooLarge, rest);
       return true;
     }
