@@ -213,6 +213,25 @@ std::string_view refusalText(Refusal refusal) {
   return "";
 }
 
+bool libraryNeeds(std::string_view name) {
+  if (name.empty()) return false;
+  switch (name[0] | 0x20) {
+    case 'a':
+      return equalsIgnoringCase(name, "Accept");
+    case 'c':
+      return equalsIgnoringCase(name, "Content-Type") || equalsIgnoringCase(name, "Content-Length") ||
+             equalsIgnoringCase(name, "Connection");
+    case 'e':
+      return equalsIgnoringCase(name, "Expect");
+    case 'h':
+      return equalsIgnoringCase(name, "Host");
+    case 't':
+      return equalsIgnoringCase(name, "Transfer-Encoding");
+    default:
+      return false;
+  }
+}
+
 HeadReading readHead(std::string_view head, const HeadLimits& limits) {
   HeadReading reading;
   const auto refuse = [&reading](Refusal refusal) {
@@ -227,7 +246,7 @@ HeadReading readHead(std::string_view head, const HeadLimits& limits) {
   if (const Refusal r = readRequestLine(line, parsed); r != Refusal::kNone) return refuse(r);
   if (const Refusal r = readTarget(line, parsed, reading); r != Refusal::kNone) return refuse(r);
 
-  size_t fields = 0;
+  size_t kept = 0;  // bytes and records the library will hold
   size_t hosts = 0;
   bool hasLength = false;
   Codings codings;
@@ -242,7 +261,7 @@ HeadReading readHead(std::string_view head, const HeadLimits& limits) {
     const std::string_view name = line.substr(0, colon);
     const std::string_view value = trimSpaces(line.substr(colon + 1));
     if (!isFieldText(value)) return refuse(Refusal::kMalformedField);
-    ++fields;
+    if (libraryNeeds(name)) kept += line.size() + 2 + limits.fieldRecordBytes;
     if (equalsIgnoringCase(name, "Host")) {
       ++hosts;
     } else if (equalsIgnoringCase(name, "Content-Length")) {
@@ -255,7 +274,7 @@ HeadReading readHead(std::string_view head, const HeadLimits& limits) {
       addCodings(value, codings);
     }
   }
-  if (head.size() + fields * limits.fieldRecordBytes > limits.maxMemory) {
+  if (parsed.targetEnd + 11 + kept > limits.maxMemory) {
     return refuse(Refusal::kHeadTooLarge);
   }
   if (hosts > 1) return refuse(Refusal::kRepeatedHost);

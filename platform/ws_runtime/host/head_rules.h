@@ -38,10 +38,18 @@ std::string_view refusalText(Refusal refusal);
 
 struct HeadLimits {
   size_t maxBytes;   // the whole head, request line to the empty line
-  size_t maxMemory;  // the head's bytes plus a record per field, as the
-                     // library stores them in a connection's memory
+  size_t maxMemory;  // what the library keeps of it (the request line and
+                     // the fields it needs, plus a record per field) in a
+                     // connection's memory
   size_t fieldRecordBytes;
 };
+
+// Whether the HTTP library, or the host through it, needs the field: the
+// ones that frame the message or the connection, and the two the plug-in
+// reads. The others are checked and then left out of what the library
+// sees, so that its small per-connection memory holds any head within the
+// limit.
+bool libraryNeeds(std::string_view name);
 
 // What a valid head says about what follows it.
 struct HeadReading {

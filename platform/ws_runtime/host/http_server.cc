@@ -31,7 +31,7 @@ constexpr unsigned kIdleTimeoutSeconds = 60;
 // onRequestLine), so a head of kMaxHeadBytes with up to about 200 headers fits.
 // The daemon clears this memory for every request, so a larger pool costs
 // throughput on every answer.
-constexpr size_t kConnectionMemory = 32 * 1024;
+constexpr size_t kConnectionMemory = 12 * 1024;
 // The largest request head served: request line, query included, and
 // headers with their line ends.
 constexpr size_t kMaxHeadBytes = 16 * 1024;

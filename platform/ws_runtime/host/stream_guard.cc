@@ -186,23 +186,41 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
     refuseHead(reading.refusal, head);
     return true;
   }
-  const char* from = data + at;
-  if (reading.eraseTo == 0) {
-    std::memmove(data + out, from, end);
-    out += end;
-  } else {
-    std::memmove(data + out, from, reading.eraseFrom);
-    out += reading.eraseFrom;
-    if (reading.slash) data[out++] = '/';
-    std::memmove(data + out, from + reading.eraseTo, end - reading.eraseTo);
-    out += end - reading.eraseTo;
-  }
+  out = passHead(data + at, end, reading, data + out) - data;
   at += end;
   ++heads_;
   remaining_ = reading.length;
   trailerBytes_ = 0;
   state_ = reading.chunked ? State::kChunkSize : remaining_ > 0 ? State::kBody : State::kHead;
   return true;
+}
+
+char* StreamGuard::passHead(const char* head, size_t length, const HeadReading& reading, char* to) {
+  // The request line, routed by its path when it came in absolute form.
+  const size_t lineEnd = static_cast<size_t>(
+      static_cast<const char*>(std::memchr(head, '\n', length)) - head) + 1;
+  if (reading.eraseTo == 0) {
+    std::memmove(to, head, lineEnd);
+    to += lineEnd;
+  } else {
+    std::memmove(to, head, reading.eraseFrom);
+    to += reading.eraseFrom;
+    if (reading.slash) *to++ = '/';
+    std::memmove(to, head + reading.eraseTo, lineEnd - reading.eraseTo);
+    to += lineEnd - reading.eraseTo;
+  }
+  // Then only the fields the library needs, and the empty line.
+  for (size_t at = lineEnd; at < length;) {
+    const size_t end = static_cast<size_t>(
+        static_cast<const char*>(std::memchr(head + at, '\n', length - at)) - head) + 1;
+    const std::string_view line(head + at, end - at);
+    if (line.size() <= 2 || libraryNeeds(line.substr(0, line.find(':')))) {
+      std::memmove(to, line.data(), line.size());
+      to += line.size();
+    }
+    at = end;
+  }
+  return to;
 }
 
 bool StreamGuard::takeChunkLine(char* data, size_t size, size_t& at, size_t& out) {

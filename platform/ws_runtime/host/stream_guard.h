@@ -1,6 +1,7 @@
 // One connection's request stream as the host reads it, between the socket
 // and the HTTP library: every head is held back until it is complete and has
-// passed the host's head rules, and every body is followed to its end (by its
+// passed the host's head rules (and reaches the library with only the
+// fields it needs), and every body is followed to its end (by its
 // Content-Length, or chunk by chunk), so that the next head is looked for
 // exactly where a proxy in front would look for it. The library only ever
 // parses heads and chunk lines that the rules accepted. A refused head
@@ -60,6 +61,9 @@ class StreamGuard {
   size_t process(char* data, size_t size, size_t& consumed);
   // Each takes one unit at data[at]; false when it needs more bytes.
   bool takeHead(char* data, size_t size, size_t& at, size_t& out);
+  // Writes the head as the library is to see it at `to` (never past the
+  // head's own bytes) and returns the end of what it wrote.
+  char* passHead(const char* head, size_t length, const HeadReading& reading, char* to);
   bool takeChunkLine(char* data, size_t size, size_t& at, size_t& out);
   bool takeTrailerLine(char* data, size_t size, size_t& at, size_t& out);
   void refuseHead(Refusal refusal, std::string_view head);
