@@ -9,17 +9,19 @@ namespace {
 bool isDigit(unsigned char c) { return c >= '0' && c <= '9'; }
 bool isAlpha(unsigned char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
 
-// RFC 9110 5.6.2: the characters of a token.
-bool isTokenChar(unsigned char c) {
-  if (isDigit(c) || isAlpha(c)) return true;
-  switch (c) {
-    case '!': case '#': case '$': case '%': case '&': case '\'': case '*': case '+': case '-':
-    case '.': case '^': case '_': case '`': case '|': case '~':
-      return true;
-    default:
-      return false;
+// RFC 9110 5.6.2: the characters of a token, as a table because every
+// field name of every request is checked against it.
+struct TokenTable {
+  bool allowed[256] = {};
+  constexpr TokenTable() {
+    for (int c = '0'; c <= '9'; ++c) allowed[c] = true;
+    for (int c = 'a'; c <= 'z'; ++c) allowed[c] = allowed[c - 'a' + 'A'] = true;
+    for (const char c : std::string_view("!#$%&'*+-.^_`|~")) allowed[static_cast<unsigned char>(c)] = true;
   }
-}
+};
+constexpr TokenTable kTokenTable;
+
+bool isTokenChar(unsigned char c) { return kTokenTable.allowed[c]; }
 
 bool isToken(std::string_view text) {
   if (text.empty()) return false;
@@ -114,6 +116,30 @@ Refusal readTarget(std::string_view line, const RequestLine& parsed, HeadReading
     reading.eraseTo = parsed.targetStart + path;
   }
   return Refusal::kNone;
+}
+
+enum class Field : uint8_t { kOther, kNeeded, kHost, kContentLength, kTransferEncoding };
+
+// One look at the first letter settles most names without a comparison.
+Field classify(std::string_view name) {
+  if (name.empty()) return Field::kOther;
+  switch (name[0] | 0x20) {
+    case 'a':
+      return equalsIgnoringCase(name, "Accept") ? Field::kNeeded : Field::kOther;
+    case 'c':
+      if (name.size() == 14 && equalsIgnoringCase(name, "Content-Length")) return Field::kContentLength;
+      return equalsIgnoringCase(name, "Content-Type") || equalsIgnoringCase(name, "Connection")
+                 ? Field::kNeeded
+                 : Field::kOther;
+    case 'e':
+      return equalsIgnoringCase(name, "Expect") ? Field::kNeeded : Field::kOther;
+    case 'h':
+      return equalsIgnoringCase(name, "Host") ? Field::kHost : Field::kOther;
+    case 't':
+      return equalsIgnoringCase(name, "Transfer-Encoding") ? Field::kTransferEncoding : Field::kOther;
+    default:
+      return Field::kOther;
+  }
 }
 
 bool parseLength(std::string_view text, uint64_t& value) {
@@ -213,24 +239,7 @@ std::string_view refusalText(Refusal refusal) {
   return "";
 }
 
-bool libraryNeeds(std::string_view name) {
-  if (name.empty()) return false;
-  switch (name[0] | 0x20) {
-    case 'a':
-      return equalsIgnoringCase(name, "Accept");
-    case 'c':
-      return equalsIgnoringCase(name, "Content-Type") || equalsIgnoringCase(name, "Content-Length") ||
-             equalsIgnoringCase(name, "Connection");
-    case 'e':
-      return equalsIgnoringCase(name, "Expect");
-    case 'h':
-      return equalsIgnoringCase(name, "Host");
-    case 't':
-      return equalsIgnoringCase(name, "Transfer-Encoding");
-    default:
-      return false;
-  }
-}
+bool libraryNeeds(std::string_view name) { return classify(name) != Field::kOther; }
 
 HeadReading readHead(std::string_view head, const HeadLimits& limits) {
   HeadReading reading;
@@ -261,16 +270,21 @@ HeadReading readHead(std::string_view head, const HeadLimits& limits) {
     const std::string_view name = line.substr(0, colon);
     const std::string_view value = trimSpaces(line.substr(colon + 1));
     if (!isFieldText(value)) return refuse(Refusal::kMalformedField);
-    if (libraryNeeds(name)) kept += line.size() + 2 + limits.fieldRecordBytes;
-    if (equalsIgnoringCase(name, "Host")) {
+    const Field field = classify(name);
+    if (field == Field::kOther) {
+      reading.allNeeded = false;
+      continue;
+    }
+    kept += line.size() + 2 + limits.fieldRecordBytes;
+    if (field == Field::kHost) {
       ++hosts;
-    } else if (equalsIgnoringCase(name, "Content-Length")) {
+    } else if (field == Field::kContentLength) {
       uint64_t length = 0;
       if (!parseLength(value, length)) return refuse(Refusal::kInvalidLength);
       if (hasLength && length != reading.length) return refuse(Refusal::kConflictingLength);
       hasLength = true;
       reading.length = length;
-    } else if (equalsIgnoringCase(name, "Transfer-Encoding")) {
+    } else if (field == Field::kTransferEncoding) {
       addCodings(value, codings);
     }
   }

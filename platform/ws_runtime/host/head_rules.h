@@ -63,6 +63,9 @@ struct HeadReading {
   size_t eraseFrom = 0;
   size_t eraseTo = 0;
   bool slash = false;
+  // Whether every field is one the library needs (libraryNeeds), so that
+  // the head can pass as it is.
+  bool allNeeded = true;
 };
 
 // Reads `head`: the request line and the field lines, each with its line

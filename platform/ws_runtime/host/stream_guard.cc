@@ -196,6 +196,10 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
 }
 
 char* StreamGuard::passHead(const char* head, size_t length, const HeadReading& reading, char* to) {
+  if (reading.eraseTo == 0 && reading.allNeeded) {
+    std::memmove(to, head, length);
+    return to + length;
+  }
   // The request line, routed by its path when it came in absolute form.
   const size_t lineEnd = static_cast<size_t>(
       static_cast<const char*>(std::memchr(head, '\n', length)) - head) + 1;
