@@ -1,20 +1,40 @@
 // Request shapes that a proxy in front and the host could frame differently,
-// sent to a real ws-runtime serving the plug-in: each must get exactly the
-// answers expected, the first with the status expected, and must leave the
-// device as it was, whatever PUT was smuggled along.
+// sent to a real ws-runtime serving the plug-in, directly and through a real
+// nginx: directly, each must get exactly the answers expected, the first
+// with the status expected, and leave the device as it was, whatever PUT was
+// smuggled along; through nginx, the requests that reach the host must be
+// exactly the ones nginx forwarded, and the device changes only by a PUT it
+// forwarded.
+#include <netinet/in.h>
+#include <spawn.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <chrono>
+#include <csignal>
+#include <fstream>
+#include <sstream>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
 
 #include "support/host_process.h"
 #include "support/http_client.h"
+#include "support/scratch.h"
+
+extern char** environ;
 
 namespace {
 
 using namespace std::string_literals;
 using quillon::test_support::HostProcess;
 using quillon::test_support::RawConnection;
+
+constexpr const char* kNginx = "/usr/sbin/nginx";
 
 constexpr const char* kDevice = "/quillon/syncableDevices/pendulo/timekeeper/genericTk";
 const std::string kMediaType = "vnd.ko.syncDomain.v0/json; charset=utf-8";
@@ -27,10 +47,7 @@ const std::string kHiddenPut = "PUT " + std::string(kDevice) +
 
 size_t countAnswers(const std::string& bytes) {
   size_t count = 0;
-  for (size_t at = bytes.find("HTTP/1.1 "); at != std::string::npos;
-       at = bytes.find("HTTP/1.1 ", at + 1)) {
-    ++count;
-  }
+  for (size_t at = bytes.find("HTTP/1.1 "); at != std::string::npos; at = bytes.find("HTTP/1.1 ", at + 1)) ++count;
   return count;
 }
 
@@ -41,18 +58,18 @@ std::string deviceDocument(uint16_t port) {
   return answer.substr(answer.find("\r\n\r\n"));
 }
 
-TEST(Framing, EveryShapeIsReadOneWayAndAnsweredOnce) {
-  HostProcess host({"--quiet"});
-  const std::string before = deviceDocument(host.port());
-  ASSERT_EQ(before.find("4242"), std::string::npos);
+struct Case {
+  const char* name;
+  std::string bytes;
+  const char* status;  // of the first answer
+  size_t answers;
+};
+
+// The shapes, each smuggling a PUT where a second reader could find one.
+std::vector<Case> shapes() {
   const std::string get = "GET /quillon/resources HTTP/1.1\r\n";
   const std::string close = "Connection: close\r\n";
-  struct Case {
-    const char* name;
-    std::string bytes;
-    const char* status;
-    size_t answers;
-  } cases[] = {
+  return {
       {"space before the colon of Content-Length",
        get + "Host: t\r\nContent-Length : " + std::to_string(kHiddenPut.size()) + "\r\n\r\n" + kHiddenPut,
        "400 Bad Request", 1},
@@ -114,7 +131,14 @@ TEST(Framing, EveryShapeIsReadOneWayAndAnsweredOnce) {
            kMediaType + "\r\n" + close + "\r\n",
        "200 OK", 1},
   };
-  for (const Case& c : cases) {
+}
+
+TEST(Framing, EveryShapeIsReadOneWayAndAnsweredOnce) {
+  HostProcess host({"--quiet"});
+  const std::string before = deviceDocument(host.port());
+  ASSERT_EQ(before.find("4242"), std::string::npos);
+
+  for (const Case& c : shapes()) {
     SCOPED_TRACE(c.name);
     RawConnection connection(host.port());
     connection.send(c.bytes);
@@ -128,19 +152,15 @@ TEST(Framing, EveryShapeIsReadOneWayAndAnsweredOnce) {
 
 TEST(Framing, HeadIsAnsweredAsGetWithoutItsBody) {
   HostProcess host({"--quiet"});
-  const std::string request = " /quillon/resources HTTP/1.1\r\nHost: t\r\nConnection: close\r\n\r\n";
-  RawConnection getConnection(host.port());
-  getConnection.send("GET" + request);
-  const std::string get = getConnection.receive(2000);
-  RawConnection headConnection(host.port());
-  headConnection.send("HEAD" + request);
-  const std::string head = headConnection.receive(2000);
-  const auto fields = [](const std::string& answer) {
-    std::string out = answer.substr(0, answer.find("\r\n\r\n") + 4);
-    return out.erase(out.find("Date: "), out.find("\r\n", out.find("Date: ")) + 2 - out.find("Date: "));
+  const auto ask = [&host](const std::string& method) {
+    RawConnection connection(host.port());
+    connection.send(method + " /quillon/resources HTTP/1.1\r\nHost: t\r\nConnection: close\r\n\r\n");
+    std::string answer = connection.receive(2000);
+    const size_t date = answer.find("Date: ");
+    return date == std::string::npos ? answer : answer.erase(date, answer.find("\r\n", date) + 2 - date);
   };
-  EXPECT_EQ(fields(head), fields(get));
-  EXPECT_EQ(head, head.substr(0, head.find("\r\n\r\n") + 4)) << "no body";
+  const std::string get = ask("GET");
+  EXPECT_EQ(ask("HEAD"), get.substr(0, get.find("\r\n\r\n") + 4));
   EXPECT_EQ(get.substr(0, 15), "HTTP/1.1 200 OK");
   EXPECT_EQ(host.stop(), 0);
 }
@@ -165,6 +185,100 @@ TEST(Framing, EveryHeadAtTheEdgeOfTheConnectionMemoryIsAnswered) {
       EXPECT_TRUE(status == "HTTP/1.1 200" || status == "HTTP/1.1 431" || status == "HTTP/1.1 500") << status;
     }
   }
+  EXPECT_EQ(host.stop(), 0);
+}
+
+
+// nginx (Debian's nginx-light) in front of the host, run by the test on
+// loopback with everything under `dir`.
+class Proxy {
+ public:
+  Proxy(const answers_test::ScratchDir& dir, uint16_t upstream) {
+    const int probe = ::socket(AF_INET, SOCK_STREAM, 0);
+    sockaddr_in address{AF_INET, 0, {htonl(INADDR_LOOPBACK)}, {}};
+    socklen_t length = sizeof address;
+    ::bind(probe, reinterpret_cast<sockaddr*>(&address), sizeof address);
+    ::getsockname(probe, reinterpret_cast<sockaddr*>(&address), &length);
+    ::close(probe);
+    port_ = ntohs(address.sin_port);
+    std::ofstream(dir.file("nginx.conf"))
+        << "daemon off; master_process off; pid nginx.pid; error_log error.log;\n"
+        << "events {}\nhttp {\n  log_format forwarded '$request_method $uri $upstream_status $upstream_addr';\n"
+        << "  access_log access.log forwarded; client_body_temp_path b; proxy_temp_path p;\n"
+        << "  fastcgi_temp_path f; uwsgi_temp_path u; scgi_temp_path s;\n"
+        << "  upstream host { server 127.0.0.1:" << upstream << "; keepalive 4; }\n"
+        << "  server { listen 127.0.0.1:" << port_ << "; location / { proxy_pass http://host;\n"
+        << "    proxy_http_version 1.1; proxy_set_header Connection \"\"; } }\n}\n";
+    std::string prefix = dir.file(""), conf = dir.file("nginx.conf");
+    char* argv[] = {const_cast<char*>(kNginx), const_cast<char*>("-p"), prefix.data(), const_cast<char*>("-c"),
+                    conf.data(), nullptr};
+    if (posix_spawn(&pid_, kNginx, nullptr, nullptr, argv, environ) != 0) pid_ = -1;
+    for (int i = 0; i < 300 && pid_ > 0 && !up(); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  }
+  ~Proxy() {
+    if (pid_ > 0 && ::kill(pid_, SIGTERM) == 0) ::waitpid(pid_, nullptr, 0);
+  }
+  uint16_t port() const { return port_; }
+
+ private:
+  bool up() const try {
+    return RawConnection(port_), true;
+  } catch (const std::exception&) {
+    return false;
+  }
+  uint16_t port_ = 0;
+  pid_t pid_ = -1;
+};
+
+// The requests in `log` from `from` on, as "METHOD PATH STATUS", sorted:
+// requests on separate connections to the host may be logged in any order.
+std::vector<std::string> logged(const std::string& log, size_t from, bool byProxy) {
+  std::vector<std::string> out;
+  std::istringstream lines(log.substr(from));
+  for (std::string line; std::getline(lines, line);) {
+    std::istringstream fields(line);
+    std::string client, method, path, status, upstream;
+    if (byProxy) fields >> method >> path >> status >> upstream;
+    if (!byProxy) fields >> client >> method >> path >> status;
+    if (upstream != "-") out.push_back(method + " " + path + " " + status);  // "-": the proxy answered
+  }
+  std::sort(out.begin(), out.end());
+  return out;
+}
+
+TEST(Framing, BehindAProxyTheHostServesExactlyWhatTheProxyForwarded) {
+  if (::access(kNginx, X_OK) != 0) GTEST_SKIP() << "nginx is not installed (Debian's nginx-light)";
+  answers_test::ScratchDir scratch;
+  HostProcess host({"--access-log", scratch.file("host.log")});
+  Proxy proxy(scratch, host.port());
+  std::vector<Case> cases = shapes();
+  cases.push_back({"a PUT meant as such", kHiddenPut, "", 1});
+  std::string device = deviceDocument(host.port());
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.name);
+    const size_t hostFrom = scratch.read("host.log").size();
+    const size_t proxyFrom = scratch.read("access.log").size();
+    {
+      // The proxy logs a request once its connection is closed.
+      RawConnection client(proxy.port());
+      client.send(c.bytes + "GET /quillon/resources HTTP/1.1\r\nHost: t\r\nConnection: close\r\n\r\n");
+      client.receive(3000);
+    }
+    // Both write their lines once an answer has left, so either may lag.
+    std::vector<std::string> forwarded, served;
+    for (int i = 0; i < 100 && (i < 5 || served != forwarded); ++i) {
+      std::this_thread::sleep_for(std::chrono::milliseconds(10));
+      forwarded = logged(scratch.read("access.log"), proxyFrom, true);
+      served = logged(scratch.read("host.log"), hostFrom, false);
+    }
+    EXPECT_EQ(served, forwarded);
+    const std::string now = deviceDocument(host.port());
+    if (std::none_of(forwarded.begin(), forwarded.end(), [](const std::string& r) { return r[0] == 'P'; })) {
+      EXPECT_EQ(now, device);
+    }
+    device = now;
+  }
+  EXPECT_NE(device.find("4242"), std::string::npos) << "the PUT meant as such was served";
   EXPECT_EQ(host.stop(), 0);
 }
 
