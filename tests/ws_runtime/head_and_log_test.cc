@@ -99,7 +99,7 @@ TEST(ConnectionTable, EvictsTheLongestWaitingSlowOnesAndNeverABusyOne) {
   constexpr int kCount = 6;
   int pairs[kCount][2];
   ws::host::ConnectionTable::Entry entries[kCount];
-  ws::host::ConnectionTable table(4, 2, ws::host::Pace{1024, 0});
+  ws::host::ConnectionTable table(4, 2, ws::host::Pace{1024, 0, 60000});
   std::atomic<uint64_t> received{0};
   for (int i = 0; i < kCount; ++i) ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pairs[i]), 0);
   const auto shut = [&](int i) {
@@ -125,6 +125,15 @@ TEST(ConnectionTable, EvictsTheLongestWaitingSlowOnesAndNeverABusyOne) {
   // Below the mark nothing is evicted.
   EXPECT_EQ(table.add(entries[5], pairs[5][0]), 0u);
   EXPECT_EQ(table.size(), 4u);
+  // Not a byte for the idle time, whatever the phase: shut.
+  ws::host::ConnectionTable idle(100, 50, ws::host::Pace{1024, 0, 30});
+  ws::host::ConnectionTable::Entry still, moving;
+  idle.add(still, pairs[0][0]);
+  idle.add(moving, pairs[3][0], &received);
+  usleep(40000);
+  received += 1;
+  EXPECT_EQ(idle.check(), 1u);
+  EXPECT_EQ(std::vector<bool>({shut(0), shut(3)}), std::vector<bool>({true, false}));
   for (auto& pair : pairs) {
     close(pair[0]);
     close(pair[1]);

@@ -30,6 +30,8 @@ size_t ConnectionTable::add(Entry& entry, int fd, const std::atomic<uint64_t>* p
   entry.waiting();
   std::lock_guard<std::mutex> hold(lock_);
   const size_t evicted = entries_.size() >= highMark_ ? evictLocked() : 0;
+  entry.seen_ = entry.progress();
+  entry.seenChange_ = nowMillis();
   entry.index_ = entries_.size();
   entries_.push_back(&entry);
   return evicted;
@@ -43,9 +45,22 @@ void ConnectionTable::remove(Entry& entry) {
   entries_.pop_back();
 }
 
-size_t ConnectionTable::evictIfCrowded() {
+size_t ConnectionTable::check() {
   std::lock_guard<std::mutex> hold(lock_);
-  return entries_.size() >= highMark_ ? evictLocked() : 0;
+  const int64_t now = nowMillis();
+  size_t shut = 0;
+  for (Entry* entry : entries_) {
+    const uint64_t progress = entry->progress();
+    if (progress != entry->seen_) {
+      entry->seen_ = progress;
+      entry->seenChange_ = now;
+    } else if (now - entry->seenChange_ >= pace_.idleMillis) {
+      ::shutdown(entry->fd_, SHUT_RDWR);
+      entry->seenChange_ = now;  // not shut twice while its thread has yet to notice
+      ++shut;
+    }
+  }
+  return shut + (entries_.size() >= highMark_ ? evictLocked() : 0);
 }
 
 size_t ConnectionTable::size() const {

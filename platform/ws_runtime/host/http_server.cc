@@ -46,7 +46,7 @@ constexpr size_t kAnswerRoom = 2048;
 constexpr HeadLimits kHeadLimits{kMaxHeadBytes, kConnectionMemory - kAnswerRoom, kFieldRecordBytes};
 // When crowded, a connection that moves slower than this over its current
 // head or body, once it has had the grace period, may be shut to make room.
-constexpr Pace kMinimumPace{1024, 100};
+constexpr Pace kMinimumPace{1024, 100, kIdleTimeoutSeconds * 1000};
 // A connection the host closes while its client may still send: at most
 // this long, and this much, is read and dropped after the answer.
 constexpr LingerLimits kLinger{std::chrono::milliseconds(2000), 64 * 1024, 0};
@@ -173,7 +173,7 @@ HttpServer::HttpServer(const Options& options, const Plugin& plugin, const Acces
       connections_(highMark(options.maxConnections), lowMark(options.maxConnections),
                    kMinimumPace),
       lingering_(LingerLimits{kLinger.time, kLinger.bytes, options.lingeringSockets},
-                 [this] { connections_.evictIfCrowded(); }, kEvictionCheck) {}
+                 [this] { connections_.check(); }, kEvictionCheck) {}
 
 HttpServer::~HttpServer() {
   beginStop();
@@ -218,7 +218,6 @@ bool HttpServer::start(std::string& error) {
       {MHD_OPTION_UNESCAPE_CALLBACK, reinterpret_cast<intptr_t>(&keepEscapes), nullptr},
       {MHD_OPTION_URI_LOG_CALLBACK, reinterpret_cast<intptr_t>(&onRequestLine), this},
       {MHD_OPTION_CONNECTION_LIMIT, options_.maxConnections, nullptr},
-      {MHD_OPTION_CONNECTION_TIMEOUT, kIdleTimeoutSeconds, nullptr},
       {MHD_OPTION_CONNECTION_MEMORY_LIMIT, kConnectionMemory, nullptr},
   };
   if (options_.threads > 1) items.push_back({MHD_OPTION_THREAD_POOL_SIZE, options_.threads, nullptr});

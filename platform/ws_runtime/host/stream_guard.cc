@@ -54,6 +54,13 @@ bool crlfLine(const char* data, size_t size, size_t at, std::string_view& line, 
   return line.find('\r') == std::string_view::npos;
 }
 
+// A slow client's head can make a buffer grow to the head limit once; an
+// idle connection should not keep that for the rest of its life.
+void releaseIfLarge(std::string& buffer) {
+  if (buffer.capacity() > 4096) std::string().swap(buffer);
+  buffer.clear();
+}
+
 }  // namespace
 
 ssize_t StreamGuard::read(char* buffer, size_t size, Source source, void* context) {
@@ -66,7 +73,7 @@ ssize_t StreamGuard::read(char* buffer, size_t size, Source source, void* contex
     pendingAt_ += n;
     outUsed_ = n;
     if (pendingAt_ == pending_.size()) {
-      pending_.clear();
+      releaseIfLarge(pending_);
       pendingAt_ = 0;
     }
   }
@@ -92,6 +99,7 @@ ssize_t StreamGuard::read(char* buffer, size_t size, Source source, void* contex
       const size_t produced = process(held_.data(), held_.size(), consumed);
       emit(held_.data(), produced);
       held_.erase(0, consumed);
+      if (held_.empty()) releaseIfLarge(held_);
     }
     if (!inject_.empty()) {
       emit(inject_.data(), inject_.size());
