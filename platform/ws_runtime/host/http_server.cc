@@ -26,18 +26,18 @@ using Clock = std::chrono::steady_clock;
 
 constexpr int kListenBacklog = 1024;
 constexpr unsigned kIdleTimeoutSeconds = 60;
-// Per-connection memory for the request head, the daemon's record of each
-// header and the answer's headers. The query string is kept out of it (see
-// onRequestLine), so a head of kMaxHeadBytes with up to about 200 headers fits.
-// The daemon clears this memory for every request, so a larger pool costs
-// throughput on every answer.
+// Per-connection memory for what the daemon sees of a head (the request line
+// and the fields it needs: the stream guard leaves out the rest), its record
+// of each field and the answer's headers; the query is kept out of the
+// records (see onRequestLine). The daemon clears this memory for every
+// request, so a larger pool costs throughput on every answer.
 constexpr size_t kConnectionMemory = 12 * 1024;
 // The largest request head served: request line, query included, and
 // headers with their line ends.
 constexpr size_t kMaxHeadBytes = 16 * 1024;
 // Buffers that grew past this for one large request are given back afterwards.
 constexpr size_t kKeptBufferBytes = 64 * 1024;
-// The daemon keeps a record of each header in the connection's memory, and
+// The daemon keeps a record of each field in the connection's memory, and
 // needs room beside the head for the answer's status line and headers; a
 // head that would leave less is answered 431 by the host, never left without
 // an answer by the daemon.
@@ -49,6 +49,7 @@ constexpr HeadLimits kHeadLimits{kMaxHeadBytes, kConnectionMemory - kAnswerRoom,
 constexpr Pace kMinimumPace{1024, 100, kIdleTimeoutSeconds * 1000};
 // A connection the host closes while its client may still send: at most
 // this long, and this much, is read and dropped after the answer.
+// (How many may linger at once comes from the descriptors left: Options.)
 constexpr LingerLimits kLinger{std::chrono::milliseconds(2000), 64 * 1024, 0};
 constexpr std::chrono::milliseconds kEvictionCheck{100};
 
