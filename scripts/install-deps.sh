@@ -7,7 +7,7 @@ packages=(
   cmake ninja-build g++ pkg-config make locales
   libgtest-dev libgmock-dev libbenchmark-dev
   libcjson-dev libjansson-dev libmicrohttpd-dev libcurl4-openssl-dev libssl-dev
-  linuxptp iproute2
+  linuxptp iproute2 nginx-light
   systemd dpkg-dev binutils curl
   python3 python3-jsonschema python3-yaml
 )

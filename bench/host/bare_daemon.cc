@@ -1,12 +1,13 @@
 // The floor under the host: libmicrohttpd alone, configured as ws-runtime
 // configures it (epoll, a pool of threads accepting for themselves, the
-// answer queued on the handler's last call, the same connection memory) but
-// by default without the host's idle timeout, which libmicrohttpd pays for on
-// every request; it serves one fixed answer with no plug-in, no URL mapping
-// and no per-request state. bench/host/run.sh measures the host against it,
-// so that what the host adds is seen apart from what the machine and the
-// library allow; bench/host/instructions.sh also runs it with the host's
-// idle timeout, so that the host's own work is seen apart from the library's.
+// answer queued on the handler's last call), with 8 KiB of connection memory
+// and by default without an idle timeout, which libmicrohttpd pays for on
+// every request (the host times idle connections out itself); it serves one
+// fixed answer with no plug-in, no URL mapping and no per-request state.
+// bench/host/run.sh measures the host against it, so that what the host adds
+// is seen apart from what the machine and the library allow;
+// bench/host/instructions.sh also runs it with an idle timeout, so that the
+// library's cost of one is seen.
 //
 //   bare-http-daemon PORT THREADS FILE CONTENT-TYPE [IDLE-TIMEOUT-SECONDS]
 #include <microhttpd.h>

@@ -5,15 +5,17 @@
 # read to a few instructions, where rates (run.sh) differ by a tenth from run
 # to run on a shared machine. Servers:
 #   host       ws-runtime + the echo plug-in's fixed 200-byte answer (/echo/resources)
-#   bare+idle  libmicrohttpd alone serving the same answer, with the host's 60 s idle timeout
+#   bare+idle  libmicrohttpd alone serving the same answer, with a 60 s idle timeout of its own
 #   bare       libmicrohttpd alone, without it (the floor run.sh compares against)
 # Each server runs one pool thread and is run twice, for REQUESTS/6 and for
 # REQUESTS requests sent one after another on one connection, which makes the
 # counts repeat to within a few instructions; the difference divided by the difference in requests
-# leaves out start-up and shut-down. host minus bare+idle is the host's own
-# work per request (its bookkeeping, the URL mapping, the plug-in's calls into
-# the runtime); bare+idle minus bare is the idle timeout's. Kernel time (the
-# socket calls, the same for all three) is not counted.
+# leaves out start-up and shut-down. host minus bare is the host's own work
+# per request (its bookkeeping, the head rules, the URL mapping, the plug-in's
+# calls into the runtime, and the larger connection memory the library
+# clears); bare+idle minus bare is what the library's idle timeout would
+# cost, which the host does without. Kernel time (the socket calls, the same
+# for all three) is not counted.
 #
 # Usage: bench/host/instructions.sh [REQUESTS]   (default 12000; installs valgrind when missing)
 set -euo pipefail
@@ -78,5 +80,5 @@ bare=$(per_request "$build/bin/bare-http-daemon" PORT 1 "$work/answer" "$type")
 
 printf '%-10s %8s instructions per request\n' host "$host" bare+idle "$bare_idle" bare "$bare"
 echo
-printf 'the host'"'"'s own work     %6d\n' $((host - bare_idle))
+printf 'the host'"'"'s own work     %6d\n' $((host - bare))
 printf 'the idle timeout       %6d\n' $((bare_idle - bare))

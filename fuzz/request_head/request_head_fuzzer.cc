@@ -1,7 +1,9 @@
-// Feeds the host's head handling arbitrary header lines ("name:value", one a
-// line) and the access log's escaping arbitrary bytes. Checks that values
-// reach the plug-in trimmed, and that a logged field holds neither control
-// bytes nor invalid UTF-8.
+// Feeds arbitrary bytes to the host's head handling (as "name:value" lines),
+// its stream guard and the access log's escaping. Checks that values reach the
+// plug-in trimmed, that the guard passes on, however the bytes arrive, a
+// stream it would pass unchanged, and that a logged field holds neither
+// control bytes nor invalid UTF-8.
+#include <algorithm>
 #include <cstdint>
 #include <cstdlib>
 #include <string>
@@ -9,6 +11,7 @@
 
 #include "access_log.h"
 #include "request_head.h"
+#include "stream_guard.h"
 #include "url_mapping.h"
 
 namespace {
@@ -21,6 +24,36 @@ void checkTrimmed(const std::string_view* value) {
   if (value == nullptr || value->empty()) return;
   check(value->front() != ' ' && value->front() != '\t');
   check(value->back() != ' ' && value->back() != '\t');
+}
+
+constexpr ws::host::HeadLimits kLimits{4096, 8192, 64};
+
+struct Source {  // its bytes `step` at a time, then the end
+  std::string_view bytes;
+  size_t step;
+  static ssize_t read(void* context, char* buffer, size_t size) {
+    auto& self = *static_cast<Source*>(context);
+    const size_t n = self.bytes.copy(buffer, std::min(size, self.step));
+    self.bytes.remove_prefix(n);
+    return static_cast<ssize_t>(n);
+  }
+};
+
+// Everything the guard passes on, read `room` bytes at a time.
+std::string guarded(std::string_view bytes, size_t step, size_t room) {
+  ws::host::StreamGuard guard(kLimits);
+  Source source{bytes, step};
+  std::string out;
+  std::string buffer(room, '\0');
+  for (size_t left = bytes.size();; left = source.bytes.size()) {
+    const ssize_t got = guard.read(buffer.data(), room, &Source::read, &source);
+    if (got > 0) {
+      check(static_cast<size_t>(got) <= room);
+      out.append(buffer.data(), static_cast<size_t>(got));
+    } else if (got == 0 || source.bytes.size() == left) {
+      return out;  // the end, or a refusal after which nothing is read
+    }
+  }
 }
 
 }  // namespace
@@ -45,6 +78,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     uint64_t length = 0;
     if (head.declaredLength(length)) check(length < 10000000000000000000ULL);
   }
+
+  const std::string passed = guarded(text, 1 + (size % 7), 1 + (size % 13) * 97);
+  check(guarded(passed, 4096, 4096) == passed);
+  check(guarded(text, 4096, 4096) == passed);
 
   const std::string escaped = ws::host::escapeForLog(text, 1024);
   check(escaped.size() <= 4 * std::min<size_t>(text.size(), 1024));

@@ -19,16 +19,19 @@ int64_t nowMillis() noexcept {
 
 }  // namespace
 
-void ConnectionTable::Entry::waiting() noexcept {
-  waitingSince_.store(nowMillis(), std::memory_order_relaxed);
+void ConnectionTable::Entry::begin() noexcept {
+  mark_.store(progress(), std::memory_order_relaxed);
+  since_.store(nowMillis(), std::memory_order_relaxed);
 }
 
-size_t ConnectionTable::add(Entry& entry, int fd) {
+size_t ConnectionTable::add(Entry& entry, int fd, const std::atomic<uint64_t>* progress) {
   entry.fd_ = fd;
+  entry.progress_ = progress;
   entry.waiting();
   std::lock_guard<std::mutex> hold(lock_);
-  size_t evicted = 0;
-  if (entries_.size() >= highMark_) evicted = evictLocked(entries_.size() + 1 - lowMark_);
+  const size_t evicted = entries_.size() >= highMark_ ? evictLocked() : 0;
+  entry.seen_ = entry.progress();
+  entry.seenChange_ = nowMillis();
   entry.index_ = entries_.size();
   entries_.push_back(&entry);
   return evicted;
@@ -42,28 +45,56 @@ void ConnectionTable::remove(Entry& entry) {
   entries_.pop_back();
 }
 
+size_t ConnectionTable::check() {
+  std::lock_guard<std::mutex> hold(lock_);
+  const int64_t now = nowMillis();
+  size_t shut = 0;
+  for (Entry* entry : entries_) {
+    const uint64_t progress = entry->progress();
+    if (progress != entry->seen_) {
+      entry->seen_ = progress;
+      entry->seenChange_ = now;
+    } else if (now - entry->seenChange_ >= pace_.idleMillis) {
+      ::shutdown(entry->fd_, SHUT_RDWR);
+      entry->seenChange_ = now;  // not shut twice while its thread has yet to notice
+      ++shut;
+    }
+  }
+  return shut + (entries_.size() >= highMark_ ? evictLocked() : 0);
+}
+
 size_t ConnectionTable::size() const {
   std::lock_guard<std::mutex> hold(lock_);
   return entries_.size();
 }
 
-size_t ConnectionTable::evictLocked(size_t count) {
-  std::vector<std::pair<int64_t, Entry*>> waiting;
-  waiting.reserve(entries_.size());
+size_t ConnectionTable::evictLocked() {
+  // Room for the one arriving, down to the low mark.
+  size_t count = entries_.size() + 1 - std::min(entries_.size() + 1, lowMark_);
+  const int64_t now = nowMillis();
+  std::vector<std::pair<int64_t, Entry*>> slow;
+  slow.reserve(entries_.size());
   for (Entry* entry : entries_) {
-    const int64_t since = entry->waitingSince_.load(std::memory_order_relaxed);
-    if (since != Entry::kBusy) waiting.emplace_back(since, entry);
+    const int64_t since = entry->since_.load(std::memory_order_relaxed);
+    if (since == Entry::kBusy) continue;
+    const int64_t elapsed = now - since;
+    if (elapsed < pace_.graceMillis) continue;
+    const uint64_t moved = entry->progress() - entry->mark_.load(std::memory_order_relaxed);
+    if (moved * 1000 < pace_.minBytesPerSecond * static_cast<uint64_t>(std::max<int64_t>(elapsed, 0)) ||
+        moved == 0) {
+      slow.emplace_back(since, entry);
+    }
   }
-  count = std::min(count, waiting.size());
-  std::partial_sort(waiting.begin(), waiting.begin() + static_cast<ptrdiff_t>(count), waiting.end(),
+  count = std::min(count, slow.size());
+  std::partial_sort(slow.begin(), slow.begin() + static_cast<ptrdiff_t>(count), slow.end(),
                     [](const auto& a, const auto& b) { return a.first < b.first; });
   // Shutting the socket makes the daemon's own thread see the end of the
   // stream and close the connection its usual way; the entry leaves the
   // table then.
   for (size_t i = 0; i < count; ++i) {
-    ::shutdown(waiting[i].second->fd_, SHUT_RDWR);
+    ::shutdown(slow[i].second->fd_, SHUT_RDWR);
     // Not chosen again while its thread has yet to notice.
-    waiting[i].second->busy();
+    slow[i].second->busy();
   }
   return count;
 }

@@ -1,6 +1,7 @@
 #include "http_server.h"
 
 #include <arpa/inet.h>
+#include <sys/resource.h>
 #include <fcntl.h>
 #include <netinet/in.h>
 #include <sys/socket.h>
@@ -11,6 +12,8 @@
 #include <string_view>
 #include <vector>
 
+#include "guarded_sockets.h"
+#include "head_rules.h"
 #include "request_head.h"
 #include "url_mapping.h"
 #include "ws_runtime/exchange.h"
@@ -23,27 +26,37 @@ using Clock = std::chrono::steady_clock;
 
 constexpr int kListenBacklog = 1024;
 constexpr unsigned kIdleTimeoutSeconds = 60;
-// Per-connection memory for the request head, the daemon's record of each
-// header and the answer's headers. The query string is kept out of it (see
-// onRequestLine), so a head of kMaxHeadBytes with up to about 200 headers fits.
-// The daemon clears this memory for every request, so a larger pool costs
-// throughput on every answer.
-constexpr size_t kConnectionMemory = 32 * 1024;
+// Per-connection memory for what the daemon sees of a head (the request line
+// and the fields it needs: the stream guard leaves out the rest), its record
+// of each field and the answer's headers; the query is kept out of the
+// records (see onRequestLine). The daemon clears this memory for every
+// request, so a larger pool costs throughput on every answer.
+constexpr size_t kConnectionMemory = 12 * 1024;
 // The largest request head served: request line, query included, and
 // headers with their line ends.
 constexpr size_t kMaxHeadBytes = 16 * 1024;
 // Buffers that grew past this for one large request are given back afterwards.
 constexpr size_t kKeptBufferBytes = 64 * 1024;
+// The daemon keeps a record of each field in the connection's memory, and
+// needs room beside the head for the answer's status line and headers; a
+// head that would leave less is answered 431 by the host, never left without
+// an answer by the daemon.
+constexpr size_t kFieldRecordBytes = 64;
+constexpr size_t kAnswerRoom = 2048;
+constexpr HeadLimits kHeadLimits{kMaxHeadBytes, kConnectionMemory - kAnswerRoom, kFieldRecordBytes};
+// When crowded, a connection that moves slower than this over its current
+// head or body, once it has had the grace period, may be shut to make room.
+constexpr Pace kMinimumPace{1024, 100, kIdleTimeoutSeconds * 1000};
+// A connection the host closes while its client may still send: at most
+// this long, and this much, is read and dropped after the answer.
+// (How many may linger at once comes from the descriptors left: Options.)
+constexpr LingerLimits kLinger{std::chrono::milliseconds(2000), 64 * 1024, 0};
+constexpr std::chrono::milliseconds kEvictionCheck{100};
 
 constexpr std::string_view kNotFound = "Not Found\n";
 constexpr std::string_view kBadRequest = "Bad Request: malformed escape or invalid UTF-8 in URL\n";
 constexpr std::string_view kTooLarge = "Payload Too Large\n";
 constexpr std::string_view kUnavailable = "Service Unavailable\n";
-constexpr std::string_view kHeadTooLarge = "Request Header Fields Too Large\n";
-constexpr std::string_view kConflictingLength =
-    "Bad Request: conflicting Content-Length headers\n";
-constexpr std::string_view kLengthWithChunked =
-    "Bad Request: Content-Length together with Transfer-Encoding\n";
 constexpr std::string_view kConflictingContentType =
     "Bad Request: conflicting Content-Type headers\n";
 
@@ -65,11 +78,7 @@ size_t keepEscapes(void*, MHD_Connection*, char* text) { return std::strlen(text
 
 // One walk over the headers the daemon parsed, in the order received.
 MHD_Result collectHeader(void* into, MHD_ValueKind, const char* key, const char* value) {
-  auto& collected = *static_cast<std::pair<RequestHead*, size_t>*>(into);
-  const std::string_view name(key);
-  const std::string_view text(value != nullptr ? value : "");
-  collected.first->add(name, text);
-  collected.second += name.size() + text.size() + 4;  // ": " and the line end
+  static_cast<RequestHead*>(into)->add(key, value != nullptr ? value : "");
   return MHD_YES;
 }
 
@@ -90,6 +99,9 @@ void shrinkIfLarge(std::string& buffer) {
 
 class HttpServer::Connection {
  public:
+  int fd = -1;
+  StreamGuard guard{kHeadLimits};
+  uint64_t requests = 0;  // heads the daemon has passed on
   std::string client;
   std::u32string clientWide;
   ConnectionTable::Entry entry;
@@ -155,12 +167,28 @@ MHD_Result sendText(MHD_Connection* connection, HttpServer::Connection& state, u
 
 }  // namespace
 
+HttpServer::HttpServer(const Options& options, const Plugin& plugin, const AccessLog& log)
+    : options_(options),
+      plugin_(plugin),
+      log_(log),
+      connections_(highMark(options.maxConnections), lowMark(options.maxConnections),
+                   kMinimumPace),
+      lingering_(LingerLimits{kLinger.time, kLinger.bytes, options.lingeringSockets},
+                 [this] { connections_.check(); }, kEvictionCheck) {}
+
 HttpServer::~HttpServer() {
   beginStop();
   finishStop(std::chrono::milliseconds(0));
 }
 
 bool HttpServer::start(std::string& error) {
+  rlimit descriptors{};
+  getrlimit(RLIMIT_NOFILE, &descriptors);
+  guarded_sockets::reserve(descriptors.rlim_cur == RLIM_INFINITY ? 1u << 20 : descriptors.rlim_cur);
+  if (!lingering_.start()) {
+    error = "cannot start the lingering-close thread";
+    return false;
+  }
   const auto* address = reinterpret_cast<const sockaddr*>(&options_.address);
   const socklen_t length =
       address->sa_family == AF_INET6 ? sizeof(sockaddr_in6) : sizeof(sockaddr_in);
@@ -191,7 +219,6 @@ bool HttpServer::start(std::string& error) {
       {MHD_OPTION_UNESCAPE_CALLBACK, reinterpret_cast<intptr_t>(&keepEscapes), nullptr},
       {MHD_OPTION_URI_LOG_CALLBACK, reinterpret_cast<intptr_t>(&onRequestLine), this},
       {MHD_OPTION_CONNECTION_LIMIT, options_.maxConnections, nullptr},
-      {MHD_OPTION_CONNECTION_TIMEOUT, kIdleTimeoutSeconds, nullptr},
       {MHD_OPTION_CONNECTION_MEMORY_LIMIT, kConnectionMemory, nullptr},
   };
   if (options_.threads > 1) items.push_back({MHD_OPTION_THREAD_POOL_SIZE, options_.threads, nullptr});
@@ -224,6 +251,7 @@ void HttpServer::finishStop(std::chrono::milliseconds grace) {
   inFlight_.waitForNone(grace);
   MHD_stop_daemon(daemon_);
   daemon_ = nullptr;
+  lingering_.stop();
 }
 
 MHD_Result HttpServer::onRequest(void* self, MHD_Connection* connection, const char* url,
@@ -249,12 +277,20 @@ void HttpServer::onRequestDone(void* self, MHD_Connection*, void** requestContex
 
 void HttpServer::onConnection(void* self, MHD_Connection* connection, void** socketContext,
                               MHD_ConnectionNotificationCode event) {
-  ConnectionTable& table = static_cast<HttpServer*>(self)->connections_;
+  auto& server = *static_cast<HttpServer*>(self);
   if (event == MHD_CONNECTION_NOTIFY_CLOSED) {
     auto* state = static_cast<Connection*>(*socketContext);
-    if (state != nullptr) table.remove(state->entry);
-    delete state;
     *socketContext = nullptr;
+    if (state == nullptr) return;
+    server.connections_.remove(state->entry);
+    guarded_sockets::detach(state->fd);
+    // The daemon closes its descriptor next; a copy keeps the connection
+    // open for an orderly close while the client may still be sending.
+    if (state->fd >= 0 && !state->guard.peerClosed()) {
+      const int copy = ::fcntl(state->fd, F_DUPFD_CLOEXEC, 0);
+      if (copy >= 0) server.lingering_.adopt(copy);
+    }
+    delete state;
     return;
   }
   // Only the allocation happens here, inside the daemon's accept loop; the
@@ -263,7 +299,14 @@ void HttpServer::onConnection(void* self, MHD_Connection* connection, void** soc
   *socketContext = state;
   const MHD_ConnectionInfo* info =
       MHD_get_connection_info(connection, MHD_CONNECTION_INFO_CONNECTION_FD);
-  if (state != nullptr && info != nullptr) table.add(state->entry, info->connect_fd);
+  if (info == nullptr) return;
+  // A connection that cannot be guarded or recorded is not served.
+  if (state == nullptr || !guarded_sockets::attach(info->connect_fd, state->guard)) {
+    ::shutdown(info->connect_fd, SHUT_RDWR);
+    return;
+  }
+  state->fd = info->connect_fd;
+  server.connections_.add(state->entry, state->fd, &state->guard.receivedCounter());
 }
 
 void* HttpServer::onRequestLine(void*, const char* uri, MHD_Connection* connection) {
@@ -297,15 +340,19 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     state = info != nullptr ? static_cast<Connection*>(info->socket_context) : nullptr;
     if (state == nullptr) return MHD_NO;
     if (state->client.empty()) state->setClient(connection);
-    state->entry.busy();
+    state->entry.reading();
+    ++state->requests;
+    const Refusal refusal = state->guard.refusalFor(state->requests);
     if (log_.enabled()) {
       state->started = Clock::now();
-      state->method = method;
-      state->path = url;
+      const bool standIn = refusal != Refusal::kNone && refusal != Refusal::kMalformedChunk;
+      state->method = standIn ? state->guard.refusedMethod() : method;
+      state->path = standIn ? state->guard.refusedTarget() : url;
     }
     inFlight_.enter();
     *requestContext = state;
-    return checkHead(connection, *state, url, method);
+    if (refusal != Refusal::kNone) return refuse(connection, *state, refusal);
+    return checkHead(connection, *state);
   }
   if (*uploadSize != 0) {
     // The body is read off to its end even when it is too large, so the 413
@@ -321,30 +368,25 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     *uploadSize = 0;
     return MHD_YES;
   }
+  state->entry.busy();
+  const Refusal refusal = state->guard.refusalFor(state->requests);
+  if (refusal != Refusal::kNone) return refuse(connection, *state, refusal);
   return respond(connection, *state, url, method);
 }
 
-MHD_Result HttpServer::checkHead(MHD_Connection* connection, Connection& state, const char* url,
-                                 const char* method) {
+MHD_Result HttpServer::refuse(MHD_Connection* connection, Connection& state, Refusal refusal) {
+  return sendText(connection, state, refusalStatus(refusal), refusalText(refusal), true);
+}
+
+MHD_Result HttpServer::checkHead(MHD_Connection* connection, Connection& state) {
   // A request whose head was complete before a stop began is served; one
   // completed after it is not.
   if (stopping_) return sendText(connection, state, MHD_HTTP_SERVICE_UNAVAILABLE, kUnavailable, true);
   state.head.clear();
-  std::pair<RequestHead*, size_t> collected{&state.head, 0};
-  MHD_get_connection_values(connection, MHD_HEADER_KIND, &collectHeader, &collected);
-  // The request line: method, target and "HTTP/1.1" with spaces and line end.
-  const size_t headBytes = collected.second + std::strlen(method) + std::strlen(url) +
-                           (state.hasQuery ? state.query.size() + 1 : 0) + 12;
-  if (headBytes > kMaxHeadBytes) {
-    return sendText(connection, state, MHD_HTTP_REQUEST_HEADER_FIELDS_TOO_LARGE, kHeadTooLarge, true);
-  }
+  MHD_get_connection_values(connection, MHD_HEADER_KIND, &collectHeader, &state.head);
   switch (state.head.verdict()) {
     case HeadVerdict::kAccepted:
       break;
-    case HeadVerdict::kConflictingLength:
-      return sendText(connection, state, MHD_HTTP_BAD_REQUEST, kConflictingLength, true);
-    case HeadVerdict::kLengthWithChunked:
-      return sendText(connection, state, MHD_HTTP_BAD_REQUEST, kLengthWithChunked, true);
     case HeadVerdict::kConflictingContentType:
       return sendText(connection, state, MHD_HTTP_BAD_REQUEST, kConflictingContentType, true);
   }
@@ -392,7 +434,8 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
 MHD_Result HttpServer::runPlugin(MHD_Connection* connection, Connection& state,
                                  const char* method, ws::runtime::Exchange& exchange) {
   ws::runtime::ExchangeRequest& request = exchange.request();
-  request.method = method;
+  // HEAD is answered as GET would be; the daemon leaves the body out.
+  request.method = std::strcmp(method, MHD_HTTP_METHOD_HEAD) == 0 ? MHD_HTTP_METHOD_GET : method;
   request.clientAddress = state.clientWide;
   // Swapping keeps both buffers' storage for the connection's next request.
   request.body.swap(state.body);

@@ -16,7 +16,9 @@
 
 #include "access_log.h"
 #include "connection_table.h"
+#include "head_rules.h"
 #include "in_flight.h"
+#include "lingering_close.h"
 #include "options.h"
 #include "plugin.h"
 #include "ws_runtime/exchange.h"
@@ -25,11 +27,7 @@ namespace ws::host {
 
 class HttpServer {
  public:
-  HttpServer(const Options& options, const Plugin& plugin, const AccessLog& log)
-      : options_(options),
-        plugin_(plugin),
-        log_(log),
-        connections_(highMark(options.maxConnections), lowMark(options.maxConnections)) {}
+  HttpServer(const Options& options, const Plugin& plugin, const AccessLog& log);
   ~HttpServer();
   HttpServer(const HttpServer&) = delete;
   HttpServer& operator=(const HttpServer&) = delete;
@@ -48,9 +46,9 @@ class HttpServer {
 
   class Connection;  // per-connection state, reused across keep-alive requests
 
-  // Eviction of connections waiting for a head starts above 15/16 of the
-  // limit and makes room down to 7/8, so that the daemon always has room
-  // to accept the next client.
+  // Eviction of connections without progress starts at 15/16 of the limit
+  // and makes room down to 7/8, so that the daemon always has room to
+  // accept the next client.
   static size_t highMark(unsigned limit) { return limit - limit / 16; }
   static size_t lowMark(unsigned limit) { return limit - limit / 8; }
 
@@ -58,8 +56,8 @@ class HttpServer {
   MHD_Result answer(MHD_Connection* connection, const char* url, const char* method,
                     const char* uploadData, size_t* uploadSize, void** requestContext);
   // On the head's completion: refuses what must not reach the plug-in.
-  MHD_Result checkHead(MHD_Connection* connection, Connection& state, const char* url,
-                       const char* method);
+  MHD_Result checkHead(MHD_Connection* connection, Connection& state);
+  MHD_Result refuse(MHD_Connection* connection, Connection& state, Refusal refusal);
   MHD_Result respond(MHD_Connection* connection, Connection& state, const char* url,
                      const char* method);
   MHD_Result runPlugin(MHD_Connection* connection, Connection& state, const char* method,
@@ -82,6 +80,7 @@ class HttpServer {
   std::atomic<bool> stopping_{false};
   InFlight inFlight_;
   ConnectionTable connections_;
+  LingeringClose lingering_;
 };
 
 }  // namespace ws::host

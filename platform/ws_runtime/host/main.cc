@@ -5,8 +5,10 @@
 // 2 on a command-line error, 3 when the address cannot be served.
 #include <sys/resource.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <filesystem>
 #include <memory>
 #include <string>
 #include <vector>
@@ -27,29 +29,48 @@ constexpr std::chrono::seconds kStopGrace{10};
 
 void say(const std::string& line) { std::fprintf(stderr, "ws-runtime: %s\n", line.c_str()); }
 
-// Every connection takes a descriptor; the rest of the process needs a few.
-constexpr rlim_t kSpareDescriptors = 64;
+// Besides one descriptor per connection, the daemon takes two per pool
+// thread (its epoll set and its wake-up), and the rest of the process
+// needs a few more (the listening socket, the access log when it is
+// reopened, the plug-in's own).
+constexpr rlim_t kSpareDescriptors = 16;
 
-// Raises the descriptor limit so that the connection limit can be reached;
-// when the system does not allow that many, the connection limit comes
-// down instead.
+// The descriptors open now: connections can only use what is left.
+rlim_t descriptorsInUse() {
+  std::error_code error;
+  rlim_t count = 0;
+  for (std::filesystem::directory_iterator it("/proc/self/fd", error), end; !error && it != end;
+       it.increment(error)) {
+    ++count;
+  }
+  return error || count == 0 ? 3 : count - 1;  // the iterator's own descriptor
+}
+
+// Raises the descriptor limit so that the connection limit can be reached,
+// with room for connections being closed in an orderly way; when the system
+// does not allow that many, the connection limit comes down instead.
 void fitDescriptorLimit(ws::host::Options& options) {
   rlimit limit{};
   if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return;
-  const rlim_t wanted = options.maxConnections + kSpareDescriptors;
+  const rlim_t fixed = descriptorsInUse() + kSpareDescriptors + 2 * rlim_t{options.threads};
+  const rlim_t lingering = std::max<rlim_t>(16, options.maxConnections / 16);
+  const rlim_t wanted = fixed + options.maxConnections + lingering;
   if (limit.rlim_cur < wanted) {
     limit.rlim_cur = limit.rlim_max == RLIM_INFINITY || limit.rlim_max >= wanted ? wanted
                                                                                 : limit.rlim_max;
     setrlimit(RLIMIT_NOFILE, &limit);
     getrlimit(RLIMIT_NOFILE, &limit);
   }
-  if (limit.rlim_cur < wanted) {
-    const rlim_t fits = limit.rlim_cur > 2 * kSpareDescriptors ? limit.rlim_cur - kSpareDescriptors
-                                                               : kSpareDescriptors;
-    say("at most " + std::to_string(fits) + " connections: the descriptor limit is " +
-        std::to_string(limit.rlim_cur));
-    options.maxConnections = static_cast<unsigned>(fits);
+  if (limit.rlim_cur >= wanted) {
+    options.lingeringSockets = static_cast<unsigned>(lingering);
+    return;
   }
+  const rlim_t left = limit.rlim_cur > fixed + 2 ? limit.rlim_cur - fixed : 2;
+  const rlim_t fits = left - std::max<rlim_t>(1, left / 16);
+  say("at most " + std::to_string(fits) + " connections: the descriptor limit is " +
+      std::to_string(limit.rlim_cur));
+  options.maxConnections = static_cast<unsigned>(fits);
+  options.lingeringSockets = static_cast<unsigned>(left - fits);
 }
 
 // Answers signals until one asks for a stop; returns its name.

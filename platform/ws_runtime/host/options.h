@@ -22,6 +22,9 @@ struct Options {
   unsigned threads = 0;        // defaults to the number of processors
   uint64_t maxBody = 1024 * 1024;
   unsigned maxConnections = 10000;
+  // Not a flag: what the descriptors left after the connections allow for
+  // connections that are being closed in an orderly way (main.cc).
+  unsigned lingeringSockets = 0;
   std::string accessLog;       // empty: stderr
   bool quiet = false;
   bool help = false;

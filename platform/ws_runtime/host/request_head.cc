@@ -6,6 +6,17 @@ namespace {
 
 char lowerAscii(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
 
+// Whether the ", "-joined `list` has `value` as one of its items: the same
+// media type sent in two fields must not read as a list of two.
+bool listHolds(std::string_view list, std::string_view value) {
+  for (size_t start = 0;;) {
+    const size_t end = list.find(", ", start);
+    if (list.substr(start, end - start) == value) return true;
+    if (end == std::string_view::npos) return false;
+    start = end + 2;
+  }
+}
+
 }  // namespace
 
 bool equalsIgnoringCase(std::string_view a, std::string_view b) {
@@ -28,7 +39,6 @@ void RequestHead::clear() {
   hasAccept_ = false;
   acceptJoined_.clear();
   hasLength_ = false;
-  hasTransferEncoding_ = false;
   expectsContinue_ = false;
   verdict_ = HeadVerdict::kAccepted;
 }
@@ -44,7 +54,7 @@ void RequestHead::add(std::string_view name, std::string_view value) {
       if (!hasAccept_) {
         hasAccept_ = true;
         acceptView_ = value;
-      } else {
+      } else if (!listHolds(acceptView_, value)) {
         if (acceptJoined_.empty()) acceptJoined_.assign(acceptView_);
         acceptJoined_.append(", ").append(value);
         acceptView_ = acceptJoined_;
@@ -58,7 +68,6 @@ void RequestHead::add(std::string_view name, std::string_view value) {
         hasContentType_ = true;
         contentType_ = value;
       } else if (equalsIgnoringCase(name, "Content-Length")) {
-        if (hasLength_ && value != length_) verdict_ = HeadVerdict::kConflictingLength;
         hasLength_ = true;
         length_ = value;
       }
@@ -68,19 +77,12 @@ void RequestHead::add(std::string_view name, std::string_view value) {
         expectsContinue_ = true;
       }
       return;
-    case 't':
-      if (equalsIgnoringCase(name, "Transfer-Encoding")) hasTransferEncoding_ = true;
-      return;
     default:
       return;
   }
 }
 
-HeadVerdict RequestHead::verdict() const {
-  if (verdict_ != HeadVerdict::kAccepted) return verdict_;
-  if (hasLength_ && hasTransferEncoding_) return HeadVerdict::kLengthWithChunked;
-  return HeadVerdict::kAccepted;
-}
+HeadVerdict RequestHead::verdict() const { return verdict_; }
 
 bool RequestHead::declaredLength(uint64_t& length) const {
   if (!hasLength_ || length_.empty() || length_.size() > 19) return false;

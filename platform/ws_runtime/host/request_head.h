@@ -1,10 +1,11 @@
-// What the host takes from a request head besides its URL: the two headers a
-// plug-in may read, and the checks that keep a request from meaning one thing
-// to the host and another to a proxy in front of it.
+// What the host takes from a request head besides its URL and its framing
+// (head_rules.h): the two headers a plug-in may read, and whether the client
+// waits for "100 Continue".
 //
 // Header names compare without regard to ASCII case (never the locale's);
 // values are trimmed of surrounding spaces and tabs. Repeated Accept headers
-// combine into one list joined by ", ", as HTTP defines for list headers.
+// combine into one list joined by ", ", as HTTP defines for list headers; a
+// value the list already holds is not added again.
 //
 // Thread-safety: one RequestHead per request being read; no shared state.
 #ifndef WS_RUNTIME_HOST_REQUEST_HEAD_H_
@@ -18,8 +19,6 @@ namespace ws::host {
 
 enum class HeadVerdict {
   kAccepted,
-  kConflictingLength,       // two Content-Length values that differ
-  kLengthWithChunked,       // Content-Length together with Transfer-Encoding
   kConflictingContentType,  // two Content-Type values that differ
 };
 
@@ -49,7 +48,6 @@ class RequestHead {
   std::string acceptJoined_;
   bool hasLength_ = false;
   std::string_view length_;
-  bool hasTransferEncoding_ = false;
   bool expectsContinue_ = false;
   HeadVerdict verdict_ = HeadVerdict::kAccepted;
 };

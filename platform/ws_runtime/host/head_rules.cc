@@ -1,0 +1,314 @@
+#include "head_rules.h"
+
+#include "request_head.h"
+
+namespace ws::host {
+
+namespace {
+
+bool isDigit(unsigned char c) { return c >= '0' && c <= '9'; }
+bool isAlpha(unsigned char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
+
+// RFC 9110 5.6.2: the characters of a token, as a table because every
+// field name of every request is checked against it.
+struct TokenTable {
+  bool allowed[256] = {};
+  constexpr TokenTable() {
+    for (int c = '0'; c <= '9'; ++c) allowed[c] = true;
+    for (int c = 'a'; c <= 'z'; ++c) allowed[c] = allowed[c - 'a' + 'A'] = true;
+    for (const char c : std::string_view("!#$%&'*+-.^_`|~")) allowed[static_cast<unsigned char>(c)] = true;
+  }
+};
+constexpr TokenTable kTokenTable;
+
+bool isTokenChar(unsigned char c) { return kTokenTable.allowed[c]; }
+
+bool isToken(std::string_view text) {
+  if (text.empty()) return false;
+  for (const char c : text) {
+    if (!isTokenChar(static_cast<unsigned char>(c))) return false;
+  }
+  return true;
+}
+
+// Field values: visible characters, spaces, tabs and obs-text; a NUL, a bare
+// CR or any other control byte could end the value early for one reader and
+// not for another.
+bool isFieldText(std::string_view text) {
+  for (const char ch : text) {
+    const auto c = static_cast<unsigned char>(ch);
+    if ((c < 0x20 && c != '\t') || c == 0x7F) return false;
+  }
+  return true;
+}
+
+// Splits off the next line without its end; false when a CR stands anywhere
+// but just before the LF.
+bool nextLine(std::string_view& rest, std::string_view& line) {
+  const size_t end = rest.find('\n');
+  if (end == std::string_view::npos) return false;
+  line = rest.substr(0, end);
+  rest.remove_prefix(end + 1);
+  if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
+  return line.find('\r') == std::string_view::npos;
+}
+
+struct RequestLine {
+  size_t methodEnd = 0;
+  size_t targetStart = 0;
+  size_t targetEnd = 0;
+  bool http11 = false;
+};
+
+// method SP request-target SP HTTP-version, one space each (RFC 9112 3).
+Refusal readRequestLine(std::string_view line, RequestLine& parsed) {
+  const size_t first = line.find(' ');
+  if (first == std::string_view::npos || !isToken(line.substr(0, first))) {
+    return Refusal::kMalformedRequestLine;
+  }
+  const size_t second = line.find(' ', first + 1);
+  if (second == std::string_view::npos || second == first + 1) {
+    return Refusal::kMalformedRequestLine;
+  }
+  for (size_t i = first + 1; i < second; ++i) {
+    const auto c = static_cast<unsigned char>(line[i]);
+    if (c <= 0x20 || c == 0x7F) return Refusal::kMalformedRequestLine;
+  }
+  const std::string_view version = line.substr(second + 1);
+  if (version.size() != 8 || version.substr(0, 5) != "HTTP/" || !isDigit(version[5]) ||
+      version[6] != '.' || !isDigit(version[7])) {
+    return Refusal::kMalformedRequestLine;
+  }
+  if (version[5] != '1') return Refusal::kVersion;
+  parsed.methodEnd = first;
+  parsed.targetStart = first + 1;
+  parsed.targetEnd = second;
+  parsed.http11 = version[7] != '0';
+  return Refusal::kNone;
+}
+
+// Origin form as it is; absolute form ("scheme://authority/path?query",
+// RFC 9112 3.2.2) by its path; "*" for OPTIONS only.
+Refusal readTarget(std::string_view line, const RequestLine& parsed, HeadReading& reading) {
+  const std::string_view target =
+      line.substr(parsed.targetStart, parsed.targetEnd - parsed.targetStart);
+  if (target.front() == '/') return Refusal::kNone;
+  if (target == "*") {
+    return line.substr(0, parsed.methodEnd) == "OPTIONS" ? Refusal::kNone
+                                                         : Refusal::kMalformedRequestLine;
+  }
+  size_t i = 0;
+  while (i < target.size() && (isAlpha(static_cast<unsigned char>(target[i])) ||
+                               (i > 0 && (isDigit(static_cast<unsigned char>(target[i])) ||
+                                          target[i] == '+' || target[i] == '-' ||
+                                          target[i] == '.')))) {
+    ++i;
+  }
+  if (i == 0 || target.substr(i, 3) != "://") return Refusal::kMalformedRequestLine;
+  const size_t authority = i + 3;
+  const size_t path = target.find_first_of("/?", authority);
+  if (path == authority) return Refusal::kMalformedRequestLine;  // no host
+  reading.eraseFrom = parsed.targetStart;
+  if (path == std::string_view::npos || target[path] == '?') {
+    reading.eraseTo = parsed.targetStart + (path == std::string_view::npos ? target.size() : path);
+    reading.slash = true;
+  } else {
+    reading.eraseTo = parsed.targetStart + path;
+  }
+  return Refusal::kNone;
+}
+
+enum class Field : uint8_t { kOther, kNeeded, kHost, kContentLength, kTransferEncoding };
+
+// One look at the first letter settles most names without a comparison.
+Field classify(std::string_view name) {
+  if (name.empty()) return Field::kOther;
+  switch (name[0] | 0x20) {
+    case 'a':
+      return equalsIgnoringCase(name, "Accept") ? Field::kNeeded : Field::kOther;
+    case 'c':
+      if (name.size() == 14 && equalsIgnoringCase(name, "Content-Length")) return Field::kContentLength;
+      return equalsIgnoringCase(name, "Content-Type") || equalsIgnoringCase(name, "Connection")
+                 ? Field::kNeeded
+                 : Field::kOther;
+    case 'e':
+      return equalsIgnoringCase(name, "Expect") ? Field::kNeeded : Field::kOther;
+    case 'h':
+      return equalsIgnoringCase(name, "Host") ? Field::kHost : Field::kOther;
+    case 't':
+      return equalsIgnoringCase(name, "Transfer-Encoding") ? Field::kTransferEncoding : Field::kOther;
+    default:
+      return Field::kOther;
+  }
+}
+
+bool parseLength(std::string_view text, uint64_t& value) {
+  if (text.empty() || text.size() > 18) return false;  // no overflow below 10^18
+  value = 0;
+  for (const char c : text) {
+    if (!isDigit(static_cast<unsigned char>(c))) return false;
+    value = value * 10 + static_cast<uint64_t>(c - '0');
+  }
+  return true;
+}
+
+// What the Transfer-Encoding fields say, all of them read as one list.
+struct Codings {
+  bool present = false;
+  size_t count = 0;
+  bool lastChunked = false;
+  bool chunkedBeforeLast = false;
+  bool other = false;
+};
+
+void addCodings(std::string_view value, Codings& codings) {
+  codings.present = true;
+  while (!value.empty()) {
+    const size_t comma = value.find(',');
+    std::string_view element = trimSpaces(value.substr(0, comma));
+    value = comma == std::string_view::npos ? std::string_view() : value.substr(comma + 1);
+    if (element.empty()) continue;  // empty list elements do not count (RFC 9110 5.6.1)
+    const std::string_view name = trimSpaces(element.substr(0, element.find(';')));
+    const bool chunked = equalsIgnoringCase(name, "chunked");
+    if (codings.lastChunked) codings.chunkedBeforeLast = true;
+    codings.lastChunked = chunked;
+    if (!chunked) codings.other = true;
+    ++codings.count;
+  }
+}
+
+// RFC 9112 6.1 and 6.3: chunked must be the final coding, and once; a coding
+// the host cannot undo is 501. An HTTP/1.0 message cannot carry one at all.
+Refusal readFraming(const Codings& codings, bool hasLength, bool http11, HeadReading& reading) {
+  if (!codings.present) return Refusal::kNone;
+  if (hasLength) return Refusal::kLengthWithChunked;
+  if (!http11 || !codings.lastChunked || codings.chunkedBeforeLast) {
+    return Refusal::kChunkedNotFinal;
+  }
+  if (codings.other) return Refusal::kUnknownCoding;
+  reading.chunked = true;
+  return Refusal::kNone;
+}
+
+}  // namespace
+
+unsigned refusalStatus(Refusal refusal) {
+  switch (refusal) {
+    case Refusal::kNone:
+      return 200;
+    case Refusal::kUnknownCoding:
+      return 501;
+    case Refusal::kVersion:
+      return 505;
+    case Refusal::kHeadTooLarge:
+      return 431;
+    default:
+      return 400;
+  }
+}
+
+std::string_view refusalText(Refusal refusal) {
+  switch (refusal) {
+    case Refusal::kNone:
+      return "";
+    case Refusal::kMalformedRequestLine:
+      return "Bad Request: malformed request line\n";
+    case Refusal::kMalformedField:
+      return "Bad Request: malformed header field\n";
+    case Refusal::kMissingHost:
+      return "Bad Request: missing Host header\n";
+    case Refusal::kRepeatedHost:
+      return "Bad Request: repeated Host header\n";
+    case Refusal::kInvalidLength:
+      return "Bad Request: invalid Content-Length\n";
+    case Refusal::kConflictingLength:
+      return "Bad Request: conflicting Content-Length headers\n";
+    case Refusal::kLengthWithChunked:
+      return "Bad Request: Content-Length together with Transfer-Encoding\n";
+    case Refusal::kChunkedNotFinal:
+      return "Bad Request: chunked must be the final transfer coding, once\n";
+    case Refusal::kUnknownCoding:
+      return "Not Implemented: transfer coding other than chunked\n";
+    case Refusal::kVersion:
+      return "HTTP Version Not Supported\n";
+    case Refusal::kHeadTooLarge:
+      return "Request Header Fields Too Large\n";
+    case Refusal::kMalformedChunk:
+      return "Bad Request: malformed chunked body\n";
+  }
+  return "";
+}
+
+bool libraryNeeds(std::string_view name) { return classify(name) != Field::kOther; }
+
+HeadReading readHead(std::string_view head, const HeadLimits& limits) {
+  HeadReading reading;
+  const auto refuse = [&reading](Refusal refusal) {
+    reading.refusal = refusal;
+    return reading;
+  };
+  if (head.size() > limits.maxBytes) return refuse(Refusal::kHeadTooLarge);
+  std::string_view rest = head;
+  std::string_view line;
+  RequestLine parsed;
+  if (!nextLine(rest, line)) return refuse(Refusal::kMalformedRequestLine);
+  if (const Refusal r = readRequestLine(line, parsed); r != Refusal::kNone) return refuse(r);
+  if (const Refusal r = readTarget(line, parsed, reading); r != Refusal::kNone) return refuse(r);
+
+  size_t kept = 0;  // bytes and records the library will hold
+  size_t hosts = 0;
+  bool hasLength = false;
+  Codings codings;
+  while (!rest.empty()) {
+    // A line that starts with a space or tab continues the last one
+    // (obs-fold, RFC 9112 5.2): refused rather than unfolded.
+    if (!nextLine(rest, line)) return refuse(Refusal::kMalformedField);
+    const size_t colon = line.find(':');
+    if (colon == std::string_view::npos || !isToken(line.substr(0, colon))) {
+      return refuse(Refusal::kMalformedField);
+    }
+    const std::string_view name = line.substr(0, colon);
+    const std::string_view value = trimSpaces(line.substr(colon + 1));
+    if (!isFieldText(value)) return refuse(Refusal::kMalformedField);
+    const Field field = classify(name);
+    if (field == Field::kOther) {
+      reading.allNeeded = false;
+      continue;
+    }
+    kept += line.size() + 2 + limits.fieldRecordBytes;
+    if (field == Field::kHost) {
+      ++hosts;
+    } else if (field == Field::kContentLength) {
+      uint64_t length = 0;
+      if (!parseLength(value, length)) return refuse(Refusal::kInvalidLength);
+      if (hasLength && length != reading.length) return refuse(Refusal::kConflictingLength);
+      hasLength = true;
+      reading.length = length;
+    } else if (field == Field::kTransferEncoding) {
+      addCodings(value, codings);
+    }
+  }
+  if (parsed.targetEnd + 11 + kept > limits.maxMemory) {
+    return refuse(Refusal::kHeadTooLarge);
+  }
+  if (hosts > 1) return refuse(Refusal::kRepeatedHost);
+  if (hosts == 0 && parsed.http11) return refuse(Refusal::kMissingHost);
+  if (const Refusal r = readFraming(codings, hasLength, parsed.http11, reading);
+      r != Refusal::kNone) {
+    return refuse(r);
+  }
+  return reading;
+}
+
+size_t findHeadEnd(std::string_view bytes, size_t from) {
+  size_t at = from >= 2 ? from - 2 : 0;
+  for (;;) {
+    const size_t lf = bytes.find('\n', at);
+    if (lf == std::string_view::npos) return 0;
+    if (lf + 1 < bytes.size() && bytes[lf + 1] == '\n') return lf + 2;
+    if (lf + 2 < bytes.size() && bytes[lf + 1] == '\r' && bytes[lf + 2] == '\n') return lf + 3;
+    at = lf + 1;
+  }
+}
+
+}  // namespace ws::host
