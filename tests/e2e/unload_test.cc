@@ -210,8 +210,8 @@ TEST(Unload, HundredCyclesOnLivingThreadsLeaveNothingBehind) {
   // registers more of them (statics made on first use), and the list grows
   // by a block now and then, about 130 bytes a load on average.
   EXPECT_LE(served.heapBytes - bare.heapBytes, 512LL * (kCycles - kSettled));
-#if defined(__SANITIZE_ADDRESS__)
-  // The sanitizer keeps the shadow of every address range the library was
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+  // Either sanitizer keeps the shadow of every address range the library was
   // mapped at, more of it the more of the library ran: its resident size
   // grows by itself, so only the heap and descriptors are judged here.
 #else
