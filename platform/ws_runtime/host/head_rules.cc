@@ -23,25 +23,6 @@ constexpr TokenTable kTokenTable;
 
 bool isTokenChar(unsigned char c) { return kTokenTable.allowed[c]; }
 
-bool isToken(std::string_view text) {
-  if (text.empty()) return false;
-  for (const char c : text) {
-    if (!isTokenChar(static_cast<unsigned char>(c))) return false;
-  }
-  return true;
-}
-
-// Field values: visible characters, spaces, tabs and obs-text; a NUL, a bare
-// CR or any other control byte could end the value early for one reader and
-// not for another.
-bool isFieldText(std::string_view text) {
-  for (const char ch : text) {
-    const auto c = static_cast<unsigned char>(ch);
-    if ((c < 0x20 && c != '\t') || c == 0x7F) return false;
-  }
-  return true;
-}
-
 // Splits off the next line without its end; false when a CR stands anywhere
 // but just before the LF.
 bool nextLine(std::string_view& rest, std::string_view& line) {
@@ -309,6 +290,22 @@ size_t findHeadEnd(std::string_view bytes, size_t from) {
     if (lf + 2 < bytes.size() && bytes[lf + 1] == '\r' && bytes[lf + 2] == '\n') return lf + 3;
     at = lf + 1;
   }
+}
+
+bool isToken(std::string_view text) {
+  if (text.empty()) return false;
+  for (const char c : text) {
+    if (!isTokenChar(static_cast<unsigned char>(c))) return false;
+  }
+  return true;
+}
+
+bool isFieldText(std::string_view text) {
+  for (const char ch : text) {
+    const auto c = static_cast<unsigned char>(ch);
+    if ((c < 0x20 && c != '\t') || c == 0x7F) return false;
+  }
+  return true;
 }
 
 }  // namespace ws::host

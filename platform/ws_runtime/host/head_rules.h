@@ -44,6 +44,14 @@ struct HeadLimits {
   size_t fieldRecordBytes;
 };
 
+// RFC 9110 5.6.2: a non-empty run of token characters (field names,
+// methods, codings).
+bool isToken(std::string_view text);
+// Field values, chunk extensions and trailer values: visible characters,
+// spaces, tabs and obs-text; a NUL, a bare CR or any other control byte
+// could end the value early for one reader and not for another.
+bool isFieldText(std::string_view text);
+
 // Whether the HTTP library, or the host through it, needs the field: the
 // ones that frame the message or the connection, and the two the plug-in
 // reads. The others are checked and then left out of what the library

@@ -25,23 +25,6 @@ unsigned hexValue(char c) {
   return static_cast<unsigned>((c | 0x20) - 'a' + 10);
 }
 
-bool isToken(std::string_view text) {
-  if (text.empty()) return false;
-  for (const char c : text) {
-    const auto u = static_cast<unsigned char>(c);
-    if (u <= 0x20 || u >= 0x7F || std::strchr("\"(),/:;<=>?@[\\]{}", c) != nullptr) return false;
-  }
-  return true;
-}
-
-bool isFieldText(std::string_view text) {
-  for (const char ch : text) {
-    const auto c = static_cast<unsigned char>(ch);
-    if ((c < 0x20 && c != '\t') || c == 0x7F) return false;
-  }
-  return true;
-}
-
 // The line at data[at, size) without its CRLF; false with `length` 0 when no
 // LF has come yet, false with a length when the line does not end in CRLF.
 bool crlfLine(const char* data, size_t size, size_t at, std::string_view& line, size_t& length) {
