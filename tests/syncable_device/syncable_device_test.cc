@@ -61,6 +61,7 @@ TEST(SyncableDevice, RequirementsAreOneStrictObjectWithAnIntegerBound) {
       "The coherency requirements' \"maxOffsetNanos\" must be an integer from 0 to "
       "9223372036854775807.";
   const std::string json = "The coherency requirements are not valid JSON: ";
+  const std::string large = "The coherency requirements hold a number too large to read: ";
   struct Case {
     const char* text;
     std::string message;
@@ -74,8 +75,8 @@ TEST(SyncableDevice, RequirementsAreOneStrictObjectWithAnIntegerBound) {
       {"{\"a\":\"x\x01y\"}", json + "control character 0x1.", 7},
       {"{\"a\":\"\xff\"}", json + "unable to decode byte 0xff.", 6},
       {"{\"b\":[{\"c\":1,\"c\":2}]}", json + "duplicate object key.", 16},
-      {"{\"maxOffsetNanos\":9223372036854775808}", json + "too big integer.", 37},
-      {"{\"maxOffsetNanos\":1e999}", json + "real number overflow.", 23},
+      {"{\"maxOffsetNanos\":9223372036854775808}", large + "too big integer.", 37},
+      {"{\"maxOffsetNanos\":1e999}", large + "real number overflow.", 23},
       {"{\"maxOffsetNanos\":-1}", bound, 18},
       {"{\"maxOffsetNanos\":null}", bound, 18},
       {"{\"maxOffsetNanos\":\"1\"}", bound, 18},

@@ -103,9 +103,12 @@ bool parseRequirements(const std::string& text, Requirements* out,
   json_error_t error;
   JsonHandle root(json_loadb(text.data(), text.size(), kStrict, &error));
   if (!root) {
-    return fail(problem,
-                "The coherency requirements are not valid JSON: " +
-                    withoutQuotedToken(error.text) + ".",
+    // A number past what the decoder holds is still JSON: saying otherwise
+    // would send the client looking for a syntax error that is not there.
+    const char* what = json_error_code(&error) == json_error_numeric_overflow
+                           ? "The coherency requirements hold a number too large to read: "
+                           : "The coherency requirements are not valid JSON: ";
+    return fail(problem, what + withoutQuotedToken(error.text) + ".",
                 error.position < 0 ? 0 : static_cast<size_t>(error.position));
   }
   if (!json_is_object(root.get())) {
