@@ -1,5 +1,6 @@
 # Shell functions shared by the host benchmarks: free ports, waiting for a
-# server, and one measured wrk run. Sourced; needs $duration set.
+# server, one measured wrk run, and the demonstration ptp4l domain. Sourced;
+# needs $duration set.
 
 free_port() {
   python3 -c 'import socket; s=socket.socket(); s.bind(("127.0.0.1",0)); print(s.getsockname()[1])'
@@ -48,4 +49,23 @@ measure() {  # url connections pid
 ratio() {  # connections label numerator denominator
   awk -v c="$1" -v l="$2" -v h="${sum[$3-$1]}" -v n="${sum[$4-$1]}" \
     'BEGIN { printf "ratio -c%-3s %-26s = %.2f\n", c, l, h / n }'
+}
+
+# A scratch folder ($work), the processes to stop at exit ($pids, for the
+# caller to add to) and the demonstration domain of scripts/ptp-domain.sh in
+# it, its slave locked; all of it removed when the script exits.
+ptp_domain_up() {  # scratch-prefix namespace-prefix; needs $domain_script
+  work=$(mktemp -d "/tmp/$1-XXXXXX")
+  pids=()
+  trap ptp_domain_cleanup EXIT
+  "$domain_script" sweep
+  "$domain_script" up "$work/domain" "$2"
+  "$domain_script" lock "$work/domain"
+}
+
+ptp_domain_cleanup() {
+  for pid in "${pids[@]}"; do kill "$pid" 2>/dev/null || true; done
+  wait 2>/dev/null || true
+  "$domain_script" down "$work/domain" || true
+  rm -rf "$work"
 }

@@ -23,19 +23,7 @@ cmake --build "$build" -j "$(nproc)" --target ws-runtime quillon >/dev/null
 # shellcheck source=bench/host/common.sh
 source "$root/bench/host/common.sh"
 
-work=$(mktemp -d /tmp/bench-live-XXXXXX)
-pids=()
-cleanup() {
-  for pid in "${pids[@]}"; do kill "$pid" 2>/dev/null || true; done
-  wait 2>/dev/null || true
-  "$domain_script" down "$work/domain" || true
-  rm -rf "$work"
-}
-trap cleanup EXIT
-
-"$domain_script" sweep
-"$domain_script" up "$work/domain" "qptp$$"
-"$domain_script" lock "$work/domain"
+ptp_domain_up bench-live "qptp$$"
 
 declare -A server port
 start_host() {  # target env...

@@ -30,19 +30,7 @@ cmake --build "$build" -j 2 --target ws-runtime quillon ptp-delay-relay http-loa
 # shellcheck source=bench/host/common.sh
 source "$root/bench/host/common.sh"
 
-work=$(mktemp -d /tmp/bench-slow-daemon-XXXXXX)
-pids=()
-cleanup() {
-  for pid in "${pids[@]}"; do kill "$pid" 2>/dev/null || true; done
-  wait 2>/dev/null || true
-  "$domain_script" down "$work/domain" || true
-  rm -rf "$work"
-}
-trap cleanup EXIT
-
-"$domain_script" sweep
-"$domain_script" up "$work/domain" "q${DOMAIN_TAG:-}ptp$$"
-"$domain_script" lock "$work/domain"
+ptp_domain_up bench-slow-daemon "q${DOMAIN_TAG:-}ptp$$"
 
 "$build/bin/ptp-delay-relay" "$work/relay.sock" "$work/domain/master.sock" "$delay" \
   > "$work/relay.out" &
