@@ -251,7 +251,6 @@ TEST(UdsClient, PathsAreTheClientsOwnAndNeverLeftBehind) {
   EXPECT_EQ(failure.error, ENAMETOOLONG);
 }
 
-}  // namespace
 // A service's runtime directory wins when it can hold client paths.
 TEST(UdsClient, ClientPathsGoToTheServiceRuntimeDirectoryWhenItIsUsable) {
   answers_test::ScratchDir dir;
@@ -273,4 +272,5 @@ TEST(UdsClient, ClientPathsGoToTheServiceRuntimeDirectoryWhenItIsUsable) {
   }
 }
 
+}  // namespace
 }  // namespace ptpmgmt
