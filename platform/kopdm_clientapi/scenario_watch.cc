@@ -50,19 +50,15 @@ bool ScenarioWatch::settle(bool readWell, const std::function<bool()>& sameAsRea
   // The kernel reports a truncation a moment after it happened: a file read
   // empty or cut short that a program still has open, or that changes
   // within a moment, may be a write just begun.
-  const auto heldTooLong = [this] {
-    return heldSince_ && Clock::now() - *heldSince_ >= kHeldOpenLimit;
+  // Held back while a program has it open, but not for longer than the limit.
+  const auto heldOpen = [this] {
+    if (opened_ == 0 || (heldSince_ && Clock::now() - *heldSince_ >= kHeldOpenLimit)) return false;
+    holdBack();
+    return true;
   };
-  if (opened_ > 0 && !heldTooLong()) {
-    holdBack();
-    return false;
-  }
+  if (heldOpen()) return false;
   std::this_thread::sleep_for(kBrokenFileSettling);
-  if (!sameAsRead() || !unchanged()) return false;
-  if (opened_ > 0 && !heldTooLong()) {
-    holdBack();
-    return false;
-  }
+  if (!sameAsRead() || !unchanged() || heldOpen()) return false;
   heldSince_.reset();
   return true;
 }
