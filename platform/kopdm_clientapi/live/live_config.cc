@@ -144,7 +144,8 @@ void readTimeReferences(const cJSON* root, LiveConfig& config) {
     }
     config.trs.push_back(std::move(tr));
   }
-  const size_t answerBytes = timeReferencesAnswer(config).size();
+  // Measured as the service renders it.
+  const size_t answerBytes = kopdmsim::renderMember("timeReferences", trIdList(config)).size();
   if (answerBytes > kMaxAnswerBytes) {
     invalid("\"timeReferences\" lists more than the plug-in can read: the answer naming them "
             "would be " + std::to_string(answerBytes) + " bytes, more than 1023");
@@ -225,13 +226,13 @@ std::string markNulEscapes(const std::string& text) {
 
 }  // namespace
 
-std::string timeReferencesAnswer(const LiveConfig& config) {
-  std::string answer = "{\"timeReferences\":[";
-  for (size_t i = 0; i < config.trs.size(); ++i) {
-    if (i > 0) answer += ',';
-    answer += jsonString(config.trs[i].id);
+std::string trIdList(const LiveConfig& config) {
+  std::string list = "[";
+  for (const TrConfig& tr : config.trs) {
+    if (list.size() > 1) list += ',';
+    list += jsonString(tr.id);
   }
-  return answer + "]}";
+  return list + "]";
 }
 
 bool parseLiveConfig(const std::string& text, LiveConfig* out, std::string* problem) {

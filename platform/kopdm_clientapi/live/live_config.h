@@ -33,8 +33,9 @@ struct LiveConfig {
   uint32_t maxAgeMillis = 100;      // a daemon's state is asked again when older
 };
 
-// The manager's answer for "timeReferences": the ids, in file order.
-std::string timeReferencesAnswer(const LiveConfig& config);
+// The value of the manager's "timeReferences": a JSON list of the ids, in
+// file order.
+std::string trIdList(const LiveConfig& config);
 
 // Reads a configuration text. False, with a sentence saying what is wrong,
 // when it is not a usable configuration.

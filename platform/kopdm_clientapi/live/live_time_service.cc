@@ -29,12 +29,6 @@ std::string jsonList(const std::vector<std::string>& items) {
   return list + "]";
 }
 
-std::string trIdList(const LiveConfig& config) {
-  std::vector<std::string> ids;
-  for (const TrConfig& tr : config.trs) ids.push_back(tr.id);
-  return jsonList(ids);
-}
-
 const char* selectionName(const LiveConfig& config) {
   return config.automaticSelection ? "automatic" : "configured";
 }
