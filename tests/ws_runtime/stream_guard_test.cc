@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -45,22 +46,37 @@ TEST(StreamGuard, PassesTheSameStreamHoweverItArrivesAndStopsAtARefusal) {
                               "005;x=\"y\"\r\nhello\r\n0\r\nTrailer: t\r\n\r\n";
   const std::string chunkedHead = chunked.substr(0, chunked.find("\r\n\r\n") + 4);
   const std::string plain = "GET /b HTTP/1.1\r\nHost: h\r\nContent-Length: 3\r\n\r\nxyz";
+  // Heads whose queries the library never sees, pipelined past the most
+  // the guard keeps waiting.
+  const std::string longQuery(15000, 'q');
+  std::string queued;
+  for (int i = 0; i < 5; ++i) queued += "GET /q?" + longQuery + " HTTP/1.1\r\nHost: h\r\n\r\n";
   struct Case {
     const char* name;
     std::string in;
     std::string seen;
     uint64_t refusedHead;
     Refusal refusal;
+    std::vector<const char*> queries;  // each head's, in order; null for none
   } cases[] = {
       {"pipelined, chunked, absolute form", "\r\n" + chunked + plain + "GET http://h:1?q HTTP/1.1\r\nX: 1\r\nHost: h\r\n\r\n",
        "PUT /a HTTP/1.1\r\nHost: h\r\nTransfer-Encoding: chunked\r\n\r\n5\r\nhello\r\n0\r\n\r\n" + plain +
-           "GET /?q HTTP/1.1\r\nHost: h\r\n\r\n",
-       0, Refusal::kNone},
+           "GET / HTTP/1.1\r\nHost: h\r\n\r\n",
+       0, Refusal::kNone, {nullptr, nullptr, "q"}},
+      {"queries, empty and absolute", "GET /a?x=1&y HTTP/1.1\r\nHost: h\r\n\r\nGET /b? HTTP/1.0\r\n\r\n"
+       "GET http://h/c/d?e=/f?g HTTP/1.1\r\nHost: h\r\n\r\n",
+       "GET /a HTTP/1.1\r\nHost: h\r\n\r\nGET /b HTTP/1.0\r\n\r\nGET /c/d HTTP/1.1\r\nHost: h\r\n\r\n", 0,
+       Refusal::kNone, {"x=1&y", "", "e=/f?g"}},
+      {"too many queries waiting", queued,
+       std::string("GET /q HTTP/1.1\r\nHost: h\r\n\r\n") + "GET /q HTTP/1.1\r\nHost: h\r\n\r\n" +
+           "GET /q HTTP/1.1\r\nHost: h\r\n\r\n" + "GET /q HTTP/1.1\r\nHost: h\r\n\r\n" +
+           "GET / HTTP/1.1\r\nHost: -\r\n\r\n",
+       5, Refusal::kHeadTooLarge, {longQuery.c_str(), longQuery.c_str(), longQuery.c_str(), longQuery.c_str(), nullptr}},
       {"a refused head after a good one", plain + "GET /c HTTP/1.1\r\nHost : h\r\n\r\n" + plain,
-       plain + "GET / HTTP/1.1\r\nHost: -\r\n\r\n", 2, Refusal::kMalformedField},
-      {"a malformed chunk", chunkedHead + "5\r\nhelloXX" + plain, chunkedHead + "5\r\nhello\r\n0\r\n\r\n", 1, Refusal::kMalformedChunk},
+       plain + "GET / HTTP/1.1\r\nHost: -\r\n\r\n", 2, Refusal::kMalformedField, {}},
+      {"a malformed chunk", chunkedHead + "5\r\nhelloXX" + plain, chunkedHead + "5\r\nhello\r\n0\r\n\r\n", 1, Refusal::kMalformedChunk, {}},
       {"a head with no end in sight", "GET /" + std::string(17000, 'a'), "GET / HTTP/1.1\r\nHost: -\r\n\r\n", 1,
-       Refusal::kHeadTooLarge},
+       Refusal::kHeadTooLarge, {}},
   };
   for (const Case& c : cases) {
     for (const size_t step : {1, 2, 7, 100, 65536}) {
@@ -71,6 +87,11 @@ TEST(StreamGuard, PassesTheSameStreamHoweverItArrivesAndStopsAtARefusal) {
         EXPECT_EQ(drain(guard, socket, room), c.seen);
         EXPECT_EQ(guard.refusalFor(c.refusedHead), c.refusal);
         EXPECT_EQ(guard.refusalFor(c.refusedHead + 1), Refusal::kNone);
+        for (size_t head = 1; head <= c.queries.size(); ++head) {
+          std::string query = "unchanged";
+          EXPECT_EQ(guard.takeQuery(head, query), c.queries[head - 1] != nullptr) << head;
+          EXPECT_EQ(query, c.queries[head - 1] != nullptr ? c.queries[head - 1] : "unchanged") << head;
+        }
       }
     }
   }

@@ -9,63 +9,97 @@ namespace {
 bool isDigit(unsigned char c) { return c >= '0' && c <= '9'; }
 bool isAlpha(unsigned char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
 
-// RFC 9110 5.6.2: the characters of a token, as a table because every
-// field name of every request is checked against it.
-struct TokenTable {
-  bool allowed[256] = {};
-  constexpr TokenTable() {
-    for (int c = '0'; c <= '9'; ++c) allowed[c] = true;
-    for (int c = 'a'; c <= 'z'; ++c) allowed[c] = allowed[c - 'a' + 'A'] = true;
-    for (const char c : std::string_view("!#$%&'*+-.^_`|~")) allowed[static_cast<unsigned char>(c)] = true;
+// What each byte may be, as one table, because every byte of every head
+// is looked up in it: a token character (RFC 9110 5.6.2: field names,
+// methods, codings), field text (visible characters, SP, HTAB, obs-text),
+// or a byte that may stand in a request target.
+enum CharClass : uint8_t { kToken = 1, kFieldText = 2, kTargetChar = 4 };
+struct CharTable {
+  uint8_t bits[256] = {};
+  constexpr CharTable() {
+    for (int c = 0; c < 256; ++c) {
+      if (c == '\t' || (c >= 0x20 && c != 0x7F)) bits[c] |= kFieldText;
+      if (c > 0x20 && c != 0x7F) bits[c] |= kTargetChar;
+    }
+    for (int c = '0'; c <= '9'; ++c) bits[c] |= kToken;
+    for (int c = 'a'; c <= 'z'; ++c) bits[c] |= kToken, bits[c - 'a' + 'A'] |= kToken;
+    for (const char c : std::string_view("!#$%&'*+-.^_`|~")) bits[static_cast<unsigned char>(c)] |= kToken;
   }
 };
-constexpr TokenTable kTokenTable;
+constexpr CharTable kChars;
 
-bool isTokenChar(unsigned char c) { return kTokenTable.allowed[c]; }
+bool is(char c, CharClass cls) { return (kChars.bits[static_cast<unsigned char>(c)] & cls) != 0; }
 
-// Splits off the next line without its end; false when a CR stands anywhere
-// but just before the LF.
-bool nextLine(std::string_view& rest, std::string_view& line) {
-  const size_t end = rest.find('\n');
-  if (end == std::string_view::npos) return false;
-  line = rest.substr(0, end);
-  rest.remove_prefix(end + 1);
-  if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
-  return line.find('\r') == std::string_view::npos;
+// The end of a line at `at`, just past its LF: CRLF, or a bare LF; 0 when
+// anything else follows, or nothing.
+size_t lineEndAt(std::string_view head, size_t at) {
+  if (at < head.size() && head[at] == '\n') return at + 1;
+  if (at + 1 < head.size() && head[at] == '\r' && head[at + 1] == '\n') return at + 2;
+  return 0;
 }
 
 struct RequestLine {
+  Refusal refusal = Refusal::kNone;
   size_t methodEnd = 0;
   size_t targetStart = 0;
   size_t targetEnd = 0;
   bool http11 = false;
 };
 
-// method SP request-target SP HTTP-version, one space each (RFC 9112 3).
-Refusal readRequestLine(std::string_view line, RequestLine& parsed) {
-  const size_t first = line.find(' ');
-  if (first == std::string_view::npos || !isToken(line.substr(0, first))) {
-    return Refusal::kMalformedRequestLine;
-  }
-  const size_t second = line.find(' ', first + 1);
-  if (second == std::string_view::npos || second == first + 1) {
-    return Refusal::kMalformedRequestLine;
-  }
-  for (size_t i = first + 1; i < second; ++i) {
-    const auto c = static_cast<unsigned char>(line[i]);
-    if (c <= 0x20 || c == 0x7F) return Refusal::kMalformedRequestLine;
-  }
-  const std::string_view version = line.substr(second + 1);
+// method SP request-target SP HTTP-version, one space each (RFC 9112 3);
+// returns where the line ends, past its LF.
+size_t readRequestLine(std::string_view head, RequestLine& parsed) {
+  parsed.refusal = Refusal::kMalformedRequestLine;
+  size_t at = 0;
+  while (at < head.size() && is(head[at], kToken)) ++at;
+  if (at == 0 || at == head.size() || head[at] != ' ') return 0;
+  parsed.methodEnd = at;
+  parsed.targetStart = ++at;
+  while (at < head.size() && is(head[at], kTargetChar)) ++at;
+  if (at == parsed.targetStart || at == head.size() || head[at] != ' ') return 0;
+  parsed.targetEnd = at++;
+  const std::string_view version = head.substr(at, 8);
   if (version.size() != 8 || version.substr(0, 5) != "HTTP/" || !isDigit(version[5]) ||
       version[6] != '.' || !isDigit(version[7])) {
-    return Refusal::kMalformedRequestLine;
+    return 0;
   }
-  if (version[5] != '1') return Refusal::kVersion;
-  parsed.methodEnd = first;
-  parsed.targetStart = first + 1;
-  parsed.targetEnd = second;
+  const size_t end = lineEndAt(head, at + 8);
+  if (end == 0) return 0;
+  parsed.refusal = version[5] != '1' ? Refusal::kVersion : Refusal::kNone;
   parsed.http11 = version[7] != '0';
-  return Refusal::kNone;
+  return end;
+}
+
+// A field line, name and value, the value trimmed of spaces and tabs.
+struct FieldLine {
+  std::string_view name;
+  std::string_view value;
+  size_t length = 0;  // of the line without its line end
+};
+
+// Reads the field line at `at` and returns where the next one starts; 0 when
+// the line is malformed: a name that is not a token or does not end at the
+// colon (a line starting with a space or tab is an obs-fold, RFC 9112 5.2,
+// refused rather than unfolded), a byte in the value that is not field
+// text, or a CR anywhere but just before the LF.
+size_t readFieldLine(std::string_view head, size_t at, FieldLine& field) {
+  const size_t start = at;
+  while (at < head.size() && is(head[at], kToken)) ++at;
+  if (at == start || at == head.size() || head[at] != ':') return 0;
+  field.name = head.substr(start, at - start);
+  ++at;
+  while (at < head.size() && (head[at] == ' ' || head[at] == '\t')) ++at;
+  const size_t valueStart = at;
+  size_t valueEnd = at;
+  while (at < head.size() && is(head[at], kFieldText)) {
+    if (head[at] != ' ' && head[at] != '\t') valueEnd = at + 1;
+    ++at;
+  }
+  const size_t next = lineEndAt(head, at);
+  if (next == 0) return 0;
+  field.value = head.substr(valueStart, valueEnd - valueStart);
+  field.length = at - start;
+  return next;
 }
 
 // Origin form as it is; absolute form ("scheme://authority/path?query",
@@ -229,47 +263,45 @@ HeadReading readHead(std::string_view head, const HeadLimits& limits) {
     return reading;
   };
   if (head.size() > limits.maxBytes) return refuse(Refusal::kHeadTooLarge);
-  std::string_view rest = head;
-  std::string_view line;
   RequestLine parsed;
-  if (!nextLine(rest, line)) return refuse(Refusal::kMalformedRequestLine);
-  if (const Refusal r = readRequestLine(line, parsed); r != Refusal::kNone) return refuse(r);
-  if (const Refusal r = readTarget(line, parsed, reading); r != Refusal::kNone) return refuse(r);
+  const size_t lineEnd = readRequestLine(head, parsed);
+  if (parsed.refusal != Refusal::kNone) return refuse(parsed.refusal);
+  if (head[parsed.targetStart] != '/') {
+    if (const Refusal r = readTarget(head, parsed, reading); r != Refusal::kNone) return refuse(r);
+  }
+  const size_t mark = head.substr(0, parsed.targetEnd).find('?', parsed.targetStart);
+  if (mark != std::string_view::npos) {
+    reading.queryFrom = mark;
+    reading.queryTo = parsed.targetEnd;
+  }
 
   size_t kept = 0;  // bytes and records the library will hold
   size_t hosts = 0;
   bool hasLength = false;
   Codings codings;
-  while (!rest.empty()) {
-    // A line that starts with a space or tab continues the last one
-    // (obs-fold, RFC 9112 5.2): refused rather than unfolded.
-    if (!nextLine(rest, line)) return refuse(Refusal::kMalformedField);
-    const size_t colon = line.find(':');
-    if (colon == std::string_view::npos || !isToken(line.substr(0, colon))) {
-      return refuse(Refusal::kMalformedField);
-    }
-    const std::string_view name = line.substr(0, colon);
-    const std::string_view value = trimSpaces(line.substr(colon + 1));
-    if (!isFieldText(value)) return refuse(Refusal::kMalformedField);
-    const Field field = classify(name);
-    if (field == Field::kOther) {
+  FieldLine field;
+  for (size_t at = lineEnd; at < head.size();) {
+    at = readFieldLine(head, at, field);
+    if (at == 0) return refuse(Refusal::kMalformedField);
+    const Field kind = classify(field.name);
+    if (kind == Field::kOther) {
       reading.allNeeded = false;
       continue;
     }
-    kept += line.size() + 2 + limits.fieldRecordBytes;
-    if (field == Field::kHost) {
+    kept += field.length + 2 + limits.fieldRecordBytes;
+    if (kind == Field::kHost) {
       ++hosts;
-    } else if (field == Field::kContentLength) {
+    } else if (kind == Field::kContentLength) {
       uint64_t length = 0;
-      if (!parseLength(value, length)) return refuse(Refusal::kInvalidLength);
+      if (!parseLength(field.value, length)) return refuse(Refusal::kInvalidLength);
       if (hasLength && length != reading.length) return refuse(Refusal::kConflictingLength);
       hasLength = true;
       reading.length = length;
-    } else if (field == Field::kTransferEncoding) {
-      addCodings(value, codings);
+    } else if (kind == Field::kTransferEncoding) {
+      addCodings(field.value, codings);
     }
   }
-  if (parsed.targetEnd + 11 + kept > limits.maxMemory) {
+  if (parsed.targetEnd - (reading.queryTo - reading.queryFrom) + 11 + kept > limits.maxMemory) {
     return refuse(Refusal::kHeadTooLarge);
   }
   if (hosts > 1) return refuse(Refusal::kRepeatedHost);
@@ -295,15 +327,14 @@ size_t findHeadEnd(std::string_view bytes, size_t from) {
 bool isToken(std::string_view text) {
   if (text.empty()) return false;
   for (const char c : text) {
-    if (!isTokenChar(static_cast<unsigned char>(c))) return false;
+    if (!is(c, kToken)) return false;
   }
   return true;
 }
 
 bool isFieldText(std::string_view text) {
-  for (const char ch : text) {
-    const auto c = static_cast<unsigned char>(ch);
-    if ((c < 0x20 && c != '\t') || c == 0x7F) return false;
+  for (const char c : text) {
+    if (!is(c, kFieldText)) return false;
   }
   return true;
 }

@@ -38,9 +38,9 @@ std::string_view refusalText(Refusal refusal);
 
 struct HeadLimits {
   size_t maxBytes;   // the whole head, request line to the empty line
-  size_t maxMemory;  // what the library keeps of it (the request line and
-                     // the fields it needs, plus a record per field) in a
-                     // connection's memory
+  size_t maxMemory;  // what the library keeps of it (the request line
+                     // without its query, and the fields it needs, plus a
+                     // record per field) in a connection's memory
   size_t fieldRecordBytes;
 };
 
@@ -71,6 +71,12 @@ struct HeadReading {
   size_t eraseFrom = 0;
   size_t eraseTo = 0;
   bool slash = false;
+  // The target's query, from its '?' to the end of the target: [queryFrom,
+  // queryTo) of the request line, kept apart from what the library sees, so
+  // that a long query never counts against its memory. queryTo is 0 when the
+  // target has no '?'.
+  size_t queryFrom = 0;
+  size_t queryTo = 0;
   // Whether every field is one the library needs (libraryNeeds), so that
   // the head can pass as it is.
   bool allNeeded = true;

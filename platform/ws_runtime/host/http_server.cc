@@ -27,11 +27,11 @@ using Clock = std::chrono::steady_clock;
 constexpr int kListenBacklog = 1024;
 constexpr unsigned kIdleTimeoutSeconds = 60;
 // Per-connection memory for what the daemon sees of a head (the request line
-// and the fields it needs: the stream guard leaves out the rest), its record
-// of each field and the answer's headers; the query is kept out of the
-// records (see onRequestLine). The daemon clears this memory for every
-// request, so a larger pool costs throughput on every answer.
-constexpr size_t kConnectionMemory = 12 * 1024;
+// without its query, and the fields it needs: the stream guard keeps the
+// rest apart), its record of each field and the answer's headers. The daemon
+// clears this memory for every request, so a larger pool costs throughput
+// on every answer.
+constexpr size_t kConnectionMemory = 8 * 1024;
 // The largest request head served: request line, query included, and
 // headers with their line ends.
 constexpr size_t kMaxHeadBytes = 16 * 1024;
@@ -105,8 +105,8 @@ class HttpServer::Connection {
   std::string client;
   std::u32string clientWide;
   ConnectionTable::Entry entry;
-  // The request in progress: its query as taken before the daemon would
-  // have split it, what the host reads of its headers, and its answer.
+  // The request in progress: its query as the stream guard kept it, what
+  // the host reads of its headers, and its answer.
   std::string query;
   bool hasQuery = false;
   std::vector<RawParameter> parameters;
@@ -217,7 +217,6 @@ bool HttpServer::start(std::string& error) {
       {MHD_OPTION_NOTIFY_COMPLETED, reinterpret_cast<intptr_t>(&onRequestDone), this},
       {MHD_OPTION_NOTIFY_CONNECTION, reinterpret_cast<intptr_t>(&onConnection), this},
       {MHD_OPTION_UNESCAPE_CALLBACK, reinterpret_cast<intptr_t>(&keepEscapes), nullptr},
-      {MHD_OPTION_URI_LOG_CALLBACK, reinterpret_cast<intptr_t>(&onRequestLine), this},
       {MHD_OPTION_CONNECTION_LIMIT, options_.maxConnections, nullptr},
       {MHD_OPTION_CONNECTION_MEMORY_LIMIT, kConnectionMemory, nullptr},
   };
@@ -309,26 +308,6 @@ void HttpServer::onConnection(void* self, MHD_Connection* connection, void** soc
   server.connections_.add(state->entry, state->fd, &state->guard.receivedCounter());
 }
 
-void* HttpServer::onRequestLine(void*, const char* uri, MHD_Connection* connection) {
-  // The daemon would next split the query into records in the connection's
-  // small memory, one record per parameter, so a long query of short
-  // parameters would not fit and its 431 would never leave. The query is
-  // taken here instead, and the daemon is left an empty one: it splits the
-  // query only after this call, at the '?' found before it. The request line
-  // lies in the connection's read buffer, which is writable.
-  const char* mark = std::strchr(uri, '?');
-  if (mark == nullptr) return nullptr;
-  const MHD_ConnectionInfo* info =
-      MHD_get_connection_info(connection, MHD_CONNECTION_INFO_SOCKET_CONTEXT);
-  auto* state = info != nullptr ? static_cast<Connection*>(info->socket_context) : nullptr;
-  if (state != nullptr) {
-    state->query.assign(mark + 1);
-    state->hasQuery = true;
-  }
-  const_cast<char*>(mark)[1] = '\0';
-  return nullptr;  // the request context stays empty until the head is complete
-}
-
 MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const char* method,
                               const char* uploadData, size_t* uploadSize, void** requestContext) {
   auto* state = static_cast<Connection*>(*requestContext);
@@ -342,6 +321,7 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     if (state->client.empty()) state->setClient(connection);
     state->entry.reading();
     ++state->requests;
+    state->hasQuery = state->guard.takeQuery(state->requests, state->query);
     const Refusal refusal = state->guard.refusalFor(state->requests);
     if (log_.enabled()) {
       state->started = Clock::now();

@@ -69,7 +69,6 @@ class HttpServer {
                               size_t* uploadSize, void** requestContext);
   static void onRequestDone(void* self, MHD_Connection* connection, void** requestContext,
                             MHD_RequestTerminationCode reason);
-  static void* onRequestLine(void* self, const char* uri, MHD_Connection* connection);
   static void onConnection(void* self, MHD_Connection* connection, void** socketContext,
                            MHD_ConnectionNotificationCode event);
 

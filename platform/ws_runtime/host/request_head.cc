@@ -22,7 +22,12 @@ bool listHolds(std::string_view list, std::string_view value) {
 bool equalsIgnoringCase(std::string_view a, std::string_view b) {
   if (a.size() != b.size()) return false;
   for (size_t i = 0; i < a.size(); ++i) {
-    if (lowerAscii(a[i]) != lowerAscii(b[i])) return false;
+    const auto x = static_cast<unsigned char>(a[i]);
+    const auto y = static_cast<unsigned char>(b[i]);
+    if (x == y) continue;
+    // Differing only in the case bit, and a letter.
+    const unsigned lower = x | 0x20u;
+    if ((x ^ y) != 0x20u || lower < 'a' || lower > 'z') return false;
   }
   return true;
 }

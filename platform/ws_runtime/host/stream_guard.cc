@@ -13,6 +13,10 @@ namespace {
 constexpr std::string_view kStandIn = "GET / HTTP/1.1\r\nHost: -\r\n\r\n";
 // Chunk lines are a size and at most a few extensions.
 constexpr size_t kMaxChunkLine = 4096;
+// The queries of pipelined heads wait in the guard until their requests
+// begin; a client that sends more than this ahead gets 431 for the head
+// that would exceed it. One head's query alone always fits.
+constexpr size_t kMaxQueuedQueryBytes = 64 * 1024;
 // Kept of a refused request line for the access log, which cuts at 1024.
 constexpr size_t kMaxLoggedLine = 1025;
 
@@ -177,6 +181,15 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
     refuseHead(reading.refusal, head);
     return true;
   }
+  if (reading.queryTo != 0) {
+    const size_t size = reading.queryTo - reading.queryFrom - 1;  // after the '?'
+    if (!queries_.empty() && queryBytes_ + size > kMaxQueuedQueryBytes) {
+      refuseHead(Refusal::kHeadTooLarge, head);
+      return true;
+    }
+    queries_.push_back(Query{heads_ + 1, std::string(head.substr(reading.queryFrom + 1, size))});
+    queryBytes_ += size;
+  }
   out = passHead(data + at, end, reading, data + out) - data;
   at += end;
   ++heads_;
@@ -186,24 +199,43 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
   return true;
 }
 
+bool StreamGuard::takeQuery(uint64_t head, std::string& query) {
+  while (!queries_.empty() && queries_.front().head <= head) {
+    Query& front = queries_.front();
+    const bool wanted = front.head == head;
+    if (wanted) query.swap(front.text);
+    queryBytes_ -= wanted ? query.size() : front.text.size();
+    queries_.pop_front();
+    if (wanted) return true;
+  }
+  return false;
+}
+
 char* StreamGuard::passHead(const char* head, size_t length, const HeadReading& reading, char* to) {
-  if (reading.eraseTo == 0 && reading.allNeeded) {
-    std::memmove(to, head, length);
+  if (reading.eraseTo == 0 && reading.queryTo == 0 && reading.allNeeded) {
+    if (to != head) std::memmove(to, head, length);
     return to + length;
   }
-  // The request line, routed by its path when it came in absolute form.
+  const auto copy = [&to, head](size_t from, size_t until) {
+    std::memmove(to, head + from, until - from);
+    to += until - from;
+  };
+  // The request line, routed by its path when it came in absolute form, and
+  // without its query. Nothing is ever written past what is still to be
+  // read: a "/" only replaces a scheme and authority.
   const size_t lineEnd = static_cast<size_t>(
       static_cast<const char*>(std::memchr(head, '\n', length)) - head) + 1;
-  if (reading.eraseTo == 0) {
-    std::memmove(to, head, lineEnd);
-    to += lineEnd;
-  } else {
-    std::memmove(to, head, reading.eraseFrom);
-    to += reading.eraseFrom;
+  size_t from = 0;
+  if (reading.eraseTo != 0) {
+    copy(0, reading.eraseFrom);
     if (reading.slash) *to++ = '/';
-    std::memmove(to, head + reading.eraseTo, lineEnd - reading.eraseTo);
-    to += lineEnd - reading.eraseTo;
+    from = reading.eraseTo;
   }
+  if (reading.queryTo != 0) {
+    copy(from, reading.queryFrom);
+    from = reading.queryTo;
+  }
+  copy(from, lineEnd);
   // Then only the fields the library needs, and the empty line.
   for (size_t at = lineEnd; at < length;) {
     const size_t end = static_cast<size_t>(

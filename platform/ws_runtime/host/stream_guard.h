@@ -9,6 +9,10 @@
 // with the refusal and a close; a malformed chunk ends the body early, and
 // that request is refused the same way. Nothing after a refusal is passed on.
 //
+// Each head's query is kept apart, in the guard, and the library sees the
+// request line without it: its per-connection memory then holds the path
+// and the fields it needs, however long the query.
+//
 // The library expects recv()'s contract, read-readiness included: a read
 // shorter than asked means the socket is drained. read() keeps that promise:
 // it returns less than asked only after the socket itself returned less.
@@ -23,6 +27,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <string>
 #include <string_view>
 
@@ -44,6 +49,10 @@ class StreamGuard {
   // The refusal of the `head`-th head (counted from 1) handed to the
   // library, if that head or its body was refused.
   Refusal refusalFor(uint64_t head) const { return head == refusedHead_ ? refusal_ : Refusal::kNone; }
+  // Moves the query of the `head`-th head into `query` and returns true, or
+  // returns false when that head's target had no '?'. Heads are asked for in
+  // order; the queries of earlier heads are forgotten.
+  [[nodiscard]] bool takeQuery(uint64_t head, std::string& query);
   // The request line of a refused head, for the access log.
   const std::string& refusedMethod() const { return refusedMethod_; }
   const std::string& refusedTarget() const { return refusedTarget_; }
@@ -71,6 +80,11 @@ class StreamGuard {
   // Copies into the caller's buffer while room lasts, the rest into pending_.
   void emit(const char* data, size_t length);
 
+  struct Query {
+    uint64_t head;
+    std::string text;
+  };
+
   const HeadLimits limits_;
   State state_ = State::kHead;
   uint64_t remaining_ = 0;  // of the body or of the current chunk
@@ -81,6 +95,10 @@ class StreamGuard {
   Refusal refusal_ = Refusal::kNone;
   std::string refusedMethod_;
   std::string refusedTarget_;
+  // Queries of the heads passed on and not yet taken: more than one only
+  // when the client pipelines.
+  std::deque<Query> queries_;
+  size_t queryBytes_ = 0;
   std::string_view inject_;  // a stand-in to follow the output of process()
   std::string held_;     // an unfinished unit, not yet shown to the library
   std::string pending_;  // shown next, before anything new is read
