@@ -76,9 +76,13 @@ std::string numericAddress(const sockaddr* address) {
 // is decoded and "%2F" can stand inside a variable.
 size_t keepEscapes(void*, MHD_Connection*, char* text) { return std::strlen(text); }
 
-// One walk over the headers the daemon parsed, in the order received.
-MHD_Result collectHeader(void* into, MHD_ValueKind, const char* key, const char* value) {
-  static_cast<RequestHead*>(into)->add(key, value != nullptr ? value : "");
+// One walk over the headers the daemon parsed, in the order received, with
+// the sizes it already knows.
+MHD_Result collectHeader(void* into, MHD_ValueKind, const char* key, size_t keySize,
+                         const char* value, size_t valueSize) {
+  static_cast<RequestHead*>(into)->add(std::string_view(key, keySize),
+                                       value != nullptr ? std::string_view(value, valueSize)
+                                                        : std::string_view());
   return MHD_YES;
 }
 
@@ -363,7 +367,7 @@ MHD_Result HttpServer::checkHead(MHD_Connection* connection, Connection& state) 
   // completed after it is not.
   if (stopping_) return sendText(connection, state, MHD_HTTP_SERVICE_UNAVAILABLE, kUnavailable, true);
   state.head.clear();
-  MHD_get_connection_values(connection, MHD_HEADER_KIND, &collectHeader, &state.head);
+  MHD_get_connection_values_n(connection, MHD_HEADER_KIND, &collectHeader, &state.head);
   switch (state.head.verdict()) {
     case HeadVerdict::kAccepted:
       break;
@@ -414,8 +418,11 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
 MHD_Result HttpServer::runPlugin(MHD_Connection* connection, Connection& state,
                                  const char* method, ws::runtime::Exchange& exchange) {
   ws::runtime::ExchangeRequest& request = exchange.request();
-  // HEAD is answered as GET would be; the daemon leaves the body out.
-  request.method = std::strcmp(method, MHD_HTTP_METHOD_HEAD) == 0 ? MHD_HTTP_METHOD_GET : method;
+  // HEAD is answered as GET would be; the daemon leaves the body out. The
+  // exchange starts out as a GET, so the usual request writes nothing here.
+  const std::string_view asked =
+      std::strcmp(method, MHD_HTTP_METHOD_HEAD) == 0 ? MHD_HTTP_METHOD_GET : method;
+  if (asked != request.method) request.method.assign(asked);
   request.clientAddress = state.clientWide;
   // Swapping keeps both buffers' storage for the connection's next request.
   request.body.swap(state.body);

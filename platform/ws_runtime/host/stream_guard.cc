@@ -80,7 +80,9 @@ ssize_t StreamGuard::read(char* buffer, size_t size, Source source, void* contex
     size_t consumed = 0;
     if (held_.empty()) {
       outUsed_ += process(space, static_cast<size_t>(got), consumed);
-      held_.assign(space + consumed, static_cast<size_t>(got) - consumed);
+      if (consumed < static_cast<size_t>(got)) {
+        held_.assign(space + consumed, static_cast<size_t>(got) - consumed);
+      }
     } else {
       held_.append(space, static_cast<size_t>(got));
       const size_t produced = process(held_.data(), held_.size(), consumed);
