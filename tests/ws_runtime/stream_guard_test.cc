@@ -89,7 +89,7 @@ TEST(StreamGuard, PassesTheSameStreamHoweverItArrivesAndStopsAtARefusal) {
         EXPECT_EQ(guard.refusalFor(c.refusedHead + 1), Refusal::kNone);
         for (size_t head = 1; head <= c.queries.size(); ++head) {
           std::string query = "unchanged";
-          EXPECT_EQ(guard.takeQuery(head, query), c.queries[head - 1] != nullptr) << head;
+          EXPECT_EQ(guard.takeNotes(head, query).hasQuery, c.queries[head - 1] != nullptr) << head;
           EXPECT_EQ(query, c.queries[head - 1] != nullptr ? c.queries[head - 1] : "unchanged") << head;
         }
       }

@@ -152,21 +152,21 @@ Refusal readTarget(std::string_view line, const RequestLine& parsed, HeadReading
   return Refusal::kNone;
 }
 
-enum class Field : uint8_t { kOther, kNeeded, kHost, kContentLength, kTransferEncoding };
+// kRead: needed by the library, and read by the host as well.
+enum class Field : uint8_t { kOther, kNeeded, kRead, kHost, kContentLength, kTransferEncoding };
 
 // One look at the first letter settles most names without a comparison.
 Field classify(std::string_view name) {
   if (name.empty()) return Field::kOther;
   switch (name[0] | 0x20) {
     case 'a':
-      return equalsIgnoringCase(name, "Accept") ? Field::kNeeded : Field::kOther;
+      return equalsIgnoringCase(name, "Accept") ? Field::kRead : Field::kOther;
     case 'c':
       if (name.size() == 14 && equalsIgnoringCase(name, "Content-Length")) return Field::kContentLength;
-      return equalsIgnoringCase(name, "Content-Type") || equalsIgnoringCase(name, "Connection")
-                 ? Field::kNeeded
-                 : Field::kOther;
+      if (equalsIgnoringCase(name, "Content-Type")) return Field::kRead;
+      return equalsIgnoringCase(name, "Connection") ? Field::kNeeded : Field::kOther;
     case 'e':
-      return equalsIgnoringCase(name, "Expect") ? Field::kNeeded : Field::kOther;
+      return equalsIgnoringCase(name, "Expect") ? Field::kRead : Field::kOther;
     case 'h':
       return equalsIgnoringCase(name, "Host") ? Field::kHost : Field::kOther;
     case 't':
@@ -308,6 +308,7 @@ HeadReading readHead(std::string_view head, const HeadLimits& limits) {
       continue;
     }
     kept += field.length + 2 + limits.fieldRecordBytes;
+    reading.hostReads |= kind == Field::kRead || kind == Field::kContentLength;
     if (kind == Field::kHost) {
       ++hosts;
     } else if (kind == Field::kContentLength) {

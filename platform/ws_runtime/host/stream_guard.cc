@@ -183,13 +183,16 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
     refuseHead(reading.refusal, head);
     return true;
   }
-  if (reading.queryTo != 0) {
-    const size_t size = reading.queryTo - reading.queryFrom - 1;  // after the '?'
-    if (!queries_.empty() && queryBytes_ + size > kMaxQueuedQueryBytes) {
+  if (reading.queryTo != 0 || reading.hostReads) {
+    const size_t size = reading.queryTo != 0 ? reading.queryTo - reading.queryFrom - 1 : 0;
+    if (notedFront_ < noted_.size() && queryBytes_ + size > kMaxQueuedQueryBytes) {
       refuseHead(Refusal::kHeadTooLarge, head);
       return true;
     }
-    queries_.push_back(Query{heads_ + 1, std::string(head.substr(reading.queryFrom + 1, size))});
+    Noted& noted = noted_.emplace_back();
+    noted.head = heads_ + 1;
+    noted.notes = HeadNotes{reading.queryTo != 0, reading.hostReads};
+    if (size != 0) noted.query.assign(head.substr(reading.queryFrom + 1, size));
     queryBytes_ += size;
   }
   out = passHead(data + at, end, reading, data + out) - data;
@@ -201,16 +204,22 @@ bool StreamGuard::takeHead(char* data, size_t size, size_t& at, size_t& out) {
   return true;
 }
 
-bool StreamGuard::takeQuery(uint64_t head, std::string& query) {
-  while (!queries_.empty() && queries_.front().head <= head) {
-    Query& front = queries_.front();
-    const bool wanted = front.head == head;
-    if (wanted) query.swap(front.text);
-    queryBytes_ -= wanted ? query.size() : front.text.size();
-    queries_.pop_front();
-    if (wanted) return true;
+StreamGuard::HeadNotes StreamGuard::takeNotes(uint64_t head, std::string& query) {
+  HeadNotes notes;
+  while (notedFront_ < noted_.size() && noted_[notedFront_].head <= head) {
+    Noted& front = noted_[notedFront_++];
+    queryBytes_ -= front.query.size();
+    if (front.head == head) {
+      notes = front.notes;
+      if (notes.hasQuery) query.swap(front.query);
+      break;
+    }
   }
-  return false;
+  if (notedFront_ == noted_.size()) {
+    noted_.clear();
+    notedFront_ = 0;
+  }
+  return notes;
 }
 
 char* StreamGuard::passHead(const char* head, size_t length, const HeadReading& reading, char* to) {

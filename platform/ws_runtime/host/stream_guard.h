@@ -27,9 +27,9 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
-#include <deque>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "head_rules.h"
 
@@ -49,10 +49,15 @@ class StreamGuard {
   // The refusal of the `head`-th head (counted from 1) handed to the
   // library, if that head or its body was refused.
   Refusal refusalFor(uint64_t head) const { return head == refusedHead_ ? refusal_ : Refusal::kNone; }
-  // Moves the query of the `head`-th head into `query` and returns true, or
-  // returns false when that head's target had no '?'. Heads are asked for in
-  // order; the queries of earlier heads are forgotten.
-  [[nodiscard]] bool takeQuery(uint64_t head, std::string& query);
+  // What the guard noted of a head for the host.
+  struct HeadNotes {
+    bool hasQuery = false;  // its target had a '?'
+    bool hostReads = false;  // as in HeadReading
+  };
+  // The notes of the `head`-th head, its query moved into `query` when it
+  // has one. Heads are asked for in order; the notes of earlier heads are
+  // forgotten.
+  [[nodiscard]] HeadNotes takeNotes(uint64_t head, std::string& query);
   // The request line of a refused head, for the access log.
   const std::string& refusedMethod() const { return refusedMethod_; }
   const std::string& refusedTarget() const { return refusedTarget_; }
@@ -80,9 +85,10 @@ class StreamGuard {
   // Copies into the caller's buffer while room lasts, the rest into pending_.
   void emit(const char* data, size_t length);
 
-  struct Query {
+  struct Noted {
     uint64_t head;
-    std::string text;
+    HeadNotes notes;
+    std::string query;
   };
 
   const HeadLimits limits_;
@@ -95,9 +101,11 @@ class StreamGuard {
   Refusal refusal_ = Refusal::kNone;
   std::string refusedMethod_;
   std::string refusedTarget_;
-  // Queries of the heads passed on and not yet taken: more than one only
-  // when the client pipelines.
-  std::deque<Query> queries_;
+  // Notes of the heads passed on and not yet taken, from notedFront_: more
+  // than one only when the client pipelines. A head with nothing to note
+  // (no query, no field the host reads) has none.
+  std::vector<Noted> noted_;
+  size_t notedFront_ = 0;
   size_t queryBytes_ = 0;
   std::string_view inject_;  // a stand-in to follow the output of process()
   std::string held_;     // an unfinished unit, not yet shown to the library
