@@ -98,3 +98,19 @@ TEST(StreamGuard, PassesTheSameStreamHoweverItArrivesAndStopsAtARefusal) {
 }
 
 }  // namespace
+
+TEST(StreamGuard, KeepsEachQueryForItsHeadWhileTheClientStaysAhead) {
+  StreamGuard guard(kLimits);
+  char buffer[256];
+  std::string query;
+  for (int head = 1; head <= 300; ++head) {
+    SCOPED_TRACE(head);
+    Trickle socket{"GET /a?n=" + std::to_string(head) + " HTTP/1.1\r\nHost: h\r\n\r\n", 4096};
+    ASSERT_EQ(guard.read(buffer, sizeof buffer, &Trickle::read, &socket), 28);  // without the query
+    // The library begins each request only once the next head has arrived.
+    if (head > 1) {
+      ASSERT_TRUE(guard.takeNotes(head - 1, query).hasQuery);
+      EXPECT_EQ(query, "n=" + std::to_string(head - 1));
+    }
+  }
+}

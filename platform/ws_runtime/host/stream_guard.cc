@@ -215,8 +215,13 @@ StreamGuard::HeadNotes StreamGuard::takeNotes(uint64_t head, std::string& query)
       break;
     }
   }
+  // A client that always keeps a head in flight never lets the list run
+  // empty: what was taken goes once it is half of the list.
   if (notedFront_ == noted_.size()) {
     noted_.clear();
+    notedFront_ = 0;
+  } else if (notedFront_ >= 16 && notedFront_ * 2 >= noted_.size()) {
+    noted_.erase(noted_.begin(), noted_.begin() + static_cast<std::ptrdiff_t>(notedFront_));
     notedFront_ = 0;
   }
   return notes;
