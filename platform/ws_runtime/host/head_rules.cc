@@ -107,16 +107,12 @@ size_t readFieldLine(std::string_view head, size_t at, FieldLine& field) {
   while (at < head.size() && is(head[at], kToken)) ++at;
   if (at == start || at == head.size() || head[at] != ':') return 0;
   field.name = head.substr(start, at - start);
-  ++at;
-  while (at < head.size() && (head[at] == ' ' || head[at] == '\t')) ++at;
-  const size_t valueStart = at;
+  const size_t valueStart = ++at;
   at = skipPlainWords(head, at, 0x20);
   while (at < head.size() && is(head[at], kFieldText)) ++at;
   const size_t next = lineEndAt(head, at);
   if (next == 0) return 0;
-  size_t valueEnd = at;
-  while (valueEnd > valueStart && (head[valueEnd - 1] == ' ' || head[valueEnd - 1] == '\t')) --valueEnd;
-  field.value = head.substr(valueStart, valueEnd - valueStart);
+  field.value = trimSpaces(head.substr(valueStart, at - valueStart));
   field.length = at - start;
   return next;
 }

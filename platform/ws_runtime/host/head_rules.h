@@ -80,8 +80,8 @@ struct HeadReading {
   // Whether every field is one the library needs (libraryNeeds), so that
   // the head can pass as it is.
   bool allNeeded = true;
-  // Whether the head has a field the host reads besides (Accept,
-  // Content-Type, Content-Length, Expect): a head without one needs no
+  // Whether the head has a field the host reads itself (Accept,
+  // Content-Type, Content-Length or Expect): a head without one needs no
   // walk over its fields once the library has parsed it.
   bool hostReads = false;
 };

@@ -128,8 +128,7 @@ class HttpServer::Connection {
   // The request in progress: its query as the stream guard kept it, what
   // the host reads of its headers, and its answer.
   std::string query;
-  bool hasQuery = false;
-  bool hostReads = false;  // a field the host reads is in the head
+  StreamGuard::HeadNotes notes;
   std::vector<RawParameter> parameters;
   RequestHead head;
   Clock::time_point started;
@@ -148,7 +147,7 @@ class HttpServer::Connection {
   }
 
   void finish() {
-    hasQuery = false;
+    notes = {};
     query.clear();
     bodyTooLarge = false;
     shrinkIfLarge(body);
@@ -341,9 +340,7 @@ MHD_Result HttpServer::answer(MHD_Connection* connection, const char* url, const
     if (state->client.empty()) state->setClient(connection);
     state->entry.reading();
     ++state->requests;
-    const StreamGuard::HeadNotes notes = state->guard.takeNotes(state->requests, state->query);
-    state->hasQuery = notes.hasQuery;
-    state->hostReads = notes.hostReads;
+    state->notes = state->guard.takeNotes(state->requests, state->query);
     const Refusal refusal = state->guard.refusalFor(state->requests);
     if (log_.enabled()) {
       state->started = Clock::now();
@@ -385,7 +382,7 @@ MHD_Result HttpServer::checkHead(MHD_Connection* connection, Connection& state) 
   // completed after it is not.
   if (stopping_) return sendText(connection, state, MHD_HTTP_SERVICE_UNAVAILABLE, kUnavailable, true);
   state.head.clear();
-  if (state.hostReads) {
+  if (state.notes.hostReads) {
     MHD_get_connection_values_n(connection, MHD_HEADER_KIND, &collectHeader, &state.head);
   }
   switch (state.head.verdict()) {
@@ -409,7 +406,7 @@ MHD_Result HttpServer::respond(MHD_Connection* connection, Connection& state, co
                                const char* method) {
   if (state.bodyTooLarge) return sendText(connection, state, MHD_HTTP_CONTENT_TOO_LARGE, kTooLarge);
 
-  if (state.hasQuery) {
+  if (state.notes.hasQuery) {
     splitQuery(state.query, state.parameters);
   } else {
     state.parameters.clear();

@@ -101,9 +101,7 @@ int32_t SetHTTPResponseMimeType_C_REST_KO_GXWS_(uint32_t requestID, const char* 
   if (slot == nullptr) return codes::k_UNKNOWNREQUEST;
   if (mimeType == nullptr) return codes::k_INVALIDARGUMENT;
   try {
-    // Into the existing storage, as most answers set one short type.
-    slot->response.mimeType.clear();
-    slot->response.mimeType.append(mimeType);
+    ws::runtime::detail::copyInto(slot->response.mimeType, mimeType);
   } catch (const std::exception&) {
     return codes::k_OUTOFMEMORY;
   }

@@ -11,12 +11,21 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <string>
+#include <string_view>
 #include <vector>
 
 #include "ws_runtime/exchange.h"
 #include "ws_runtime/request_info.h"
 
 namespace ws::runtime::detail {
+
+// Into the string's existing storage: cheaper than assign() for the short
+// values written on every request, which never alias the target.
+inline void copyInto(std::string& to, std::string_view from) {
+  to.clear();
+  to.append(from);
+}
 
 // Each on cache lines of its own: the pool threads each run requests in a
 // slot of their own, side by side in one array, and write to it on every
